@@ -1,0 +1,105 @@
+// The table object and option block shared by the source and target spokes.
+#pragma once
+
+#include <cstdint>
+
+#include "host/zqfield.h"
+#include "host/zqhash.h"
+#include "host/zqspoke.h"
+#include "host/zqstring.h"
+#include "table/dbf.h"
+
+class ZQDBIndexBase;
+class ZQDBFoxIndex;
+class ZQFromDbase;
+class ZQToDbase;
+
+// The connector's option block: dialect, memo policy, selected index, and
+// the two type lists of the dialect.
+class ZQDbaseOptions : public ZQSpokeOptions {
+ public:
+  ZQDbaseOptions(ZQSpoke* spoke, int version);
+  ZQDbaseOptions(const ZQDbaseOptions&) = delete;
+  ZQDbaseOptions& operator=(const ZQDbaseOptions&) = delete;
+  ~ZQDbaseOptions() override;
+  ZQOptionDef** OptionList() override;
+  int OptionCount() override;
+
+  virtual void SetVersion(int version);
+  virtual int GetVersion() const { return VersionNumber; }
+  virtual int Order() { return OrderNumber; }
+  virtual void Order(int order) { OrderNumber = order; }
+  virtual int IgnoreMemoFile() const { return MemoPolicy; }
+  virtual void IgnoreMemoFile(int policy) { MemoPolicy = policy; }
+
+  static ZQOptionDef** ExportOptionList();
+  static int ExportOptionCount();
+  static ZQOptionDef** ImportOptionList();
+  static int ImportOptionCount();
+
+ protected:
+  void ResetDataTypes();
+
+  int OrderNumber = 0;
+  int VersionNumber = 2;
+  int MemoPolicy = 0;
+  const ZQDType** ValidTypes = nullptr;  // 13 entries, NULL-ended
+  const ZQDType** IndexTypes = nullptr;  // 5 entries, NULL-ended
+};
+
+// One row of the name table of the saved text form.
+struct VersionName {
+  int dialect;
+  const char* name;
+};
+extern const VersionName VersionNames[];
+
+// The table object: owns the open table, decodes records, and is the option
+// block the host reaches through GetOptions.
+class ZQDbase : public ZQDbaseOptions {
+ public:
+  static constexpr int memoptrlen = 10;
+
+  ~ZQDbase() override;
+  static const char** GetModifiedTypedefs();
+  const char* DatePicture() const { return "yyyymmdd"; }
+  const char* BooleanPicture() const { return "T.F"; }
+  void SaveOptions(ZQString& text, bool noIndex) const;
+  void LoadOptions(ZQString& text, bool ignored);
+
+ private:
+  friend class ZQFromDbase;
+  friend class ZQToDbase;
+  friend class DbaseTestPeer;  // unit tests reach the private state
+
+  explicit ZQDbase(ZQSpoke* spoke);
+  bool GetOptions(ZQSpokeOptions* opts) const;
+  BATCHERR SetOptions(const ZQSpokeOptions* opts);
+  BATCHERR DBOpenFile(const char* name, bool writable);
+  BATCHERR MakeFields(ZQRecord& layout, const ZQConnTarget& target);
+  BATCHERR ReadRecord(int32_t n);
+  BATCHERR GetRecord(ZQRecord& record, int32_t n, int64_t* position, bool withInfo);
+  void CloseFile(const ZQConnTarget* target);
+  bool IsMemoType(int type) const;
+  BATCHERR GetMemoField(ZQField* field, const ZQString& pointer, bool withInfo);
+  void DescribeIndices(const char* name);
+  ZQSpoke* OwnerSpoke() const { return Spoke(); }
+
+  ZQDBFILE* Table = nullptr;
+  int32_t DeletedSkipped = 0;
+  int32_t HighRecord = -1;
+  int32_t CurrentLogical = 0;
+  int32_t CurrentPhysical = 0;
+  char* RecordBuffer = nullptr;
+  unsigned RecordBufferSize = 0;
+  ZQString MemoText;
+  ZQHashTable RecordMap{512};
+  ZQDBFIELD* FieldList[kMaxFields] = {};
+  ZQDBIndexBase* OrderIndex = nullptr;
+  ZQDBFoxIndex* FoxIndexList = nullptr;
+  // Directory and base name of the table, without extension. Sized for the
+  // platform's paths.
+  char BasePath[4096] = {};
+  ZQDType BinaryLong{DT_LONG};
+  ZQString FieldText;
+};

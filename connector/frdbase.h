@@ -1,0 +1,46 @@
+// The source spoke: from a table to the engine's records.
+#pragma once
+
+#include "connector/dbase.h"
+#include "host/zqspoke.h"
+
+class ZQFromDbase : public ZQImport {
+ public:
+  explicit ZQFromDbase(const ZQSpokeDef& def);
+  ~ZQFromDbase() override;
+
+  ZQSpokeOptions* NewOptions() const override;
+  void DeleteOptions(ZQSpokeOptions* opts) const override;
+  bool FillOptions(ZQSpokeOptions* opts) const override;
+  BATCHERR SetOptions(const ZQSpokeOptions* opts) override;
+  bool SupportIndexes() const override { return true; }
+  bool SupportURI() const override { return true; }
+  int MaxFieldCount() override;
+  void LoadOptions(ZQString& text) override;
+  int OptionDefCount() const override;
+  ZQOptionDef** GetOptionDefs() const override;
+  bool ConnectionEstablished() override { return dbase.Table != nullptr; }
+  BATCHERR ConnectionClose() override;
+  BATCHERR _Rewind() override { return 0; }
+  ZQSpokeOptions* GetOptions() const override;
+  void SaveOptions(ZQString& text) const override;
+
+  BATCHERR SetUserInfo(const ZQConnTarget& target) override;
+  const ZQConnTargetInfo* GetTargetInfo() const override;
+  int64_t EstimateRecordCount() override;
+  bool EstimateIsAccurate() override { return dbase.Table != nullptr; }
+  int RecordSeekGrade() override { return 9; }
+  BATCHERR MakeFields() override;
+  BATCHERR GetRecord(int32_t n) override;
+
+  // Read-only views for reports (`zqdb info`) and tests.
+  const ZQDBFILE* TableHandle() const { return dbase.Table; }
+  const ZQDBFIELD* const* Descriptors() const { return dbase.FieldList; }
+
+ private:
+  mutable ZQDbase dbase{this};
+};
+
+// Exported factories.
+extern "C++" ZQFromDbase* NewFromDbase(const ZQSpokeDef& def);
+extern "C++" void DeleteFromDbase(ZQFromDbase* spoke);

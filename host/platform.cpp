@@ -1,0 +1,69 @@
+#include "host/platform.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <climits>
+#include <ctime>
+
+int _open(const char* path, int flags, int mode) {
+  int f = O_CLOEXEC;
+  switch (flags & 3) {
+    case kRtWriteOnly: f |= O_WRONLY; break;
+    case kRtReadWrite: f |= O_RDWR; break;
+    default: f |= O_RDONLY; break;
+  }
+  if (flags & kRtCreate) f |= O_CREAT;
+  if (flags & kRtTruncate) f |= O_TRUNC;
+  if (flags & kRtExclusive) f |= O_EXCL;
+  return ::open(path, f, mode);
+}
+
+int _close(int fd) { return ::close(fd); }
+
+int32_t _lseek(int fd, int32_t offset, int whence) {
+  off_t r = ::lseek(fd, offset, whence);
+  if (r < 0 || r > INT32_MAX) return -1;
+  return int32_t(r);
+}
+
+int32_t _read(int fd, void* buffer, uint32_t count) {
+  if (count > INT32_MAX) count = INT32_MAX;
+  ssize_t n;
+  do n = ::read(fd, buffer, count);
+  while (n < 0 && errno == EINTR);
+  return int32_t(n);
+}
+
+int32_t _write(int fd, const void* buffer, uint32_t count) {
+  if (count > INT32_MAX) count = INT32_MAX;
+  ssize_t n;
+  do n = ::write(fd, buffer, count);
+  while (n < 0 && errno == EINTR);
+  return int32_t(n);
+}
+
+int _access(const char* path, int mode) {
+  int m = F_OK;
+  if (mode & 2) m |= W_OK;
+  if (mode & 4) m |= R_OK;
+  return ::access(path, m) == 0 ? 0 : -1;
+}
+
+int _unlink(const char* path) { return ::unlink(path); }
+
+FILE* _fsopen(const char* path, const char* mode, int) { return fopen(path, mode); }
+
+int64_t _time64(int64_t* out) {
+  int64_t now = int64_t(time(nullptr));
+  if (out != nullptr) *out = now;
+  return now;
+}
+
+struct tm* _localtime64(const int64_t* t) {
+  static struct tm result;
+  if (t == nullptr) return nullptr;
+  time_t tt = time_t(*t);
+  return localtime_r(&tt, &result);
+}

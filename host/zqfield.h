@@ -1,0 +1,118 @@
+// Fields and records of the host.
+//
+// A ZQField holds one value of its ZQDType's family. Text assigned to a field
+// is parsed by the field's type and picture: numbers keep their text (parsed
+// on demand by DoubleVal), dates of the picture "yyyymmdd" become a date (a
+// text that is no date is kept as it stands, so nothing is lost), logicals take
+// their first letter. Assignment reuses the field's buffers, so a record loop
+// allocates nothing once the buffers have grown.
+#pragma once
+
+#include <cstdint>
+
+#include "host/zqdate.h"
+#include "host/zqdtype.h"
+#include "host/zqstring.h"
+
+// One extra block a field may carry for its connector; the field owns it.
+class ZQFieldInfo {
+ public:
+  virtual ~ZQFieldInfo();
+};
+
+class ZQField {
+ public:
+  // What the field holds now.
+  enum class Held : uint8_t { kBlank, kText, kLong, kDouble, kDate, kDateTime, kBool };
+
+  ZQField(const ZQDType& type, const char* name);
+  virtual ~ZQField();
+  ZQField(const ZQField&) = delete;
+  ZQField& operator=(const ZQField&) = delete;
+
+  void operator=(const ZQString& text);
+  void operator=(int32_t value);
+  void operator=(double value);
+  void operator=(const ZQDateTime& value);
+  void SetDate(int32_t year, int32_t month, int32_t day);
+  void SetBool(bool value);
+  void Blank();
+
+  void Name(const char* name);
+  const char* Name() const { return name_.c_str(); }
+  const wchar* FieldName() const { return wide_name_.c_str(); }
+  const ZQDType& DataType() const { return type_; }
+  void DataType(const ZQDType& type) { type_ = type; }
+  int32_t Length() const { return type_.Length(); }
+  // 8 for the picture "yyyymmdd", 1 for "T.F", else the length.
+  int32_t DisplayLength() const;
+  int DecLen() const { return type_.DecimalPlaces(); }
+  FIELDTYPE FieldType() const { return type_.Family(); }
+
+  Held held() const { return held_; }
+  bool IsBlank() const;
+  double DoubleVal() const;
+  int64_t LongVal() const;
+  bool BoolVal() const { return held_ == Held::kBool && bool_; }
+  const ZQDate& DateRef();
+  const ZQDateTime& DateTimeRef() const { return datetime_; }
+  // The value's text form (by RenderText with flag 1); for text and numbers
+  // held as text, the text itself.
+  const ZQString& StringRef();
+
+  ZQFieldInfo* GetFieldInfo() const { return info_; }
+  // Takes `info` over; the caller deletes the old one first.
+  void SetFieldInfo(ZQFieldInfo* info) { info_ = info; }
+
+  // Puts the value's text form into `out`: flag 0 the plain number form,
+  // flag 1 the form by the field's picture.
+  virtual void RenderText(ZQString& out, int flag);
+  virtual void SetPicture(const char* picture) { type_.Picture(picture); }
+
+ private:
+  void AssignNumberText(const ZQString& text);
+  void AssignDateText(const ZQString& text);
+  void AssignBoolText(const ZQString& text);
+
+  ZQDType type_;
+  ZQString name_;
+  ZQWString wide_name_;
+  ZQString text_;
+  ZQDate date_{0, 0, 0};
+  ZQDateTime datetime_;
+  double double_ = 0;
+  int64_t long_ = 0;
+  bool bool_ = false;
+  Held held_ = Held::kBlank;
+  ZQFieldInfo* info_ = nullptr;
+};
+
+// An ordered list of fields. Fields made by NewField are owned; fields placed
+// by InstallField are borrowed and outlive ClearFields.
+class ZQRecord {
+ public:
+  ZQRecord();
+  ZQRecord(const ZQRecord& other);
+  ~ZQRecord();
+  bool operator=(const ZQRecord& other);
+
+  int FieldCount() const { return count_; }
+  ZQField* GetFieldbyPos(int pos) const { return pos >= 0 && pos < count_ ? fields_[pos] : nullptr; }
+  ZQField* operator[](int pos) const { return GetFieldbyPos(pos); }
+  // Exact name first, then without regard to case; NULL if none.
+  ZQField* GetFieldbyName(const char* name) const;
+  // NULL when memory runs out.
+  ZQField* NewField(const ZQDType& type, const char* name);
+  void ClearFields();
+  void BlankFields();
+  // Places a borrowed field at `pos` (0..FieldCount()); false when out of memory.
+  bool InstallField(int pos, ZQField* field);
+
+ private:
+  bool Grow();
+
+  ZQField** fields_ = nullptr;
+  bool* owned_ = nullptr;
+  int count_ = 0;
+  int cap_ = 0;
+};

@@ -1,1 +1,3 @@
-int main(){}
+#include "engine/cli.h"
+
+int main(int argc, char** argv) { return ZqdbMain(argc, argv); }

@@ -1,0 +1,201 @@
+#include "engine/cli.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "engine/dbf_source.h"
+#include "engine/dbfpeek.h"
+#include "engine/outbuf.h"
+#include "engine/writers.h"
+#include "host/zqglob.h"
+#include "host/zqutil.h"
+
+namespace {
+
+constexpr int kExitError = 1;
+constexpr int kExitUsage = 2;
+
+const char kUsage[] =
+    "usage: zqdb COMMAND [options] FILE...\n"
+    "\n"
+    "commands:\n"
+    "  info TABLE               dialect, version byte, record counts and fields\n"
+    "  cat TABLE                the live records (--format csv|jsonl|table)\n"
+    "\n"
+    "options (before or after the file names):\n"
+    "  --dialect D              0-10 or a name: \"dBASE IV\", foxpro, clipper, ...\n"
+    "  --codepage N             the table's code page (437, 850, 1252, ...); 0 = bytes as they are\n"
+    "  --memo never|errors|always   when to ignore the memo file (default never)\n"
+    "  --format csv|jsonl|table output of cat (default csv)\n"
+    "  --help                   this text\n";
+
+struct Args {
+  std::string command;
+  std::vector<std::string> files;
+  SourceOptions source;
+  OutputFormat format = OutputFormat::kCsv;
+};
+
+int Usage(const std::string& message) {
+  fprintf(stderr, "zqdb: %s\n%s", message.c_str(), kUsage);
+  return kExitUsage;
+}
+
+int Fail(const std::string& message) {
+  fprintf(stderr, "zqdb: %s\n", message.c_str());
+  return kExitError;
+}
+
+// Parses the command line; 0, or the exit status of a usage error.
+int ParseArgs(int argc, char** argv, Args* args) {
+  for (int i = 1; i < argc; ++i) {
+    std::string a = argv[i];
+    std::string value;
+    bool has_value = false;
+    size_t eq = a.find('=');
+    if (a.rfind("--", 0) == 0 && eq != std::string::npos) {
+      value = a.substr(eq + 1);
+      a = a.substr(0, eq);
+      has_value = true;
+    }
+    auto take = [&](std::string* v) {
+      if (has_value) {
+        *v = value;
+        return true;
+      }
+      if (i + 1 >= argc) return false;
+      *v = argv[++i];
+      return true;
+    };
+    if (a == "--help" || a == "-h") {
+      fputs(kUsage, stdout);
+      exit(0);
+    } else if (a == "--dialect") {
+      if (!take(&args->source.dialect)) return Usage("--dialect needs a value");
+    } else if (a == "--codepage") {
+      std::string v;
+      if (!take(&v)) return Usage("--codepage needs a value");
+      char* end = nullptr;
+      long cp = strtol(v.c_str(), &end, 10);
+      if (v.empty() || *end != '\0' || cp < 0 || cp > 99999 || !ZQGlob::CodePageSupported(int(cp)))
+        return Usage("unknown code page: " + v);
+      args->source.codepage = int(cp);
+    } else if (a == "--memo") {
+      std::string v;
+      if (!take(&v)) return Usage("--memo needs a value");
+      if (v == "never") args->source.memo_policy = 0;
+      else if (v == "errors") args->source.memo_policy = 1;
+      else if (v == "always") args->source.memo_policy = 2;
+      else return Usage("--memo takes never, errors or always, not " + v);
+    } else if (a == "--format") {
+      std::string v;
+      if (!take(&v)) return Usage("--format needs a value");
+      if (!ParseFormat(v, &args->format)) return Usage("--format takes csv, jsonl or table, not " + v);
+    } else if (a.rfind("--", 0) == 0 && a.size() > 2) {
+      return Usage("unknown option " + a);
+    } else if (args->command.empty()) {
+      args->command = a;
+    } else {
+      args->files.push_back(a);
+    }
+  }
+  if (args->command.empty()) return Usage("no command given");
+  return 0;
+}
+
+int OpenOrFail(const Args& args, SourcePtr* spoke) {
+  std::string error;
+  if (OpenSource(args.files[0], args.source, spoke, &error) != 0) return Fail(error);
+  return 0;
+}
+
+const char* DialectName(int dialect) {
+  static const char* const kNames[] = {"dBASE II", "dBASE III+", "dBASE IV", "Enable", "dBASE III", "(no name)",
+                                       "FoxPro", "Enable OA (Database)", "Clipper", "Visual dBASE 5.5",
+                                       "Visual FoxPro"};
+  return dialect >= 0 && dialect <= 10 ? kNames[dialect] : "?";
+}
+
+int CmdInfo(const Args& args) {
+  if (args.files.size() != 1) return Usage("info takes one table");
+  SourcePtr spoke;
+  if (int rc = OpenOrFail(args, &spoke)) return rc;
+  TableFacts facts;
+  PeekTable(args.files[0], &facts);
+  ZQString dialect;
+  spoke->GetOption("version", dialect);
+  int d = atoi(dialect.c_str());
+  int64_t header_count = spoke->EstimateRecordCount();
+  int64_t live = 0;
+  BATCHERR rc;
+  while ((rc = spoke->GetRecord(int32_t(live))) == 0) ++live;
+  if (rc != ZQ_END) return Fail(spoke->LastErrorMessage());
+  printf("table:       %s\n", args.files[0].c_str());
+  printf("dialect:     %d (%s)\n", d, DialectName(d));
+  printf("version:     0x%02X\n", facts.version);
+  printf("records:     %lld in the header, %lld live\n", static_cast<long long>(header_count),
+         static_cast<long long>(live));
+  printf("layout:      header %u bytes, record %u bytes\n", facts.header_length, facts.record_length);
+  ZQRecord* layout = spoke->GetLayout(0);
+  printf("fields:      %d\n", layout->FieldCount());
+  printf("  %-4s %-11s %-4s %5s %4s\n", "#", "name", "type", "width", "dec");
+  for (int i = 0; i < layout->FieldCount(); ++i) {
+    const ZQField* f = (*layout)[i];
+    char type = '?';
+    int width = f->Length(), dec = f->DecLen();
+    if (size_t(i) < facts.fields.size()) {
+      type = facts.fields[size_t(i)].type;
+      width = facts.fields[size_t(i)].length;
+      dec = facts.fields[size_t(i)].decimals;
+    }
+    printf("  %-4d %-11s %-4c %5d %4d\n", i + 1, f->Name(), type, width, dec);
+  }
+  spoke->ConnectionClose();
+  return 0;
+}
+
+int CmdCat(const Args& args) {
+  if (args.files.size() != 1) return Usage("cat takes one table");
+  SourcePtr spoke;
+  if (int rc = OpenOrFail(args, &spoke)) return rc;
+  OutBuf out(STDOUT_FILENO);
+  std::unique_ptr<RecordWriter> writer = MakeWriter(args.format, out);
+  ZQRecord& record = *spoke->GetLayout(0);
+  writer->Begin(record);
+  BATCHERR rc;
+  int32_t n = 0;
+  while ((rc = spoke->GetRecord(n)) == 0) {
+    writer->Row(record);
+    if (++n == INT32_MAX) break;
+  }
+  writer->End();
+  bool written = out.Flush();
+  std::string message = rc != ZQ_END ? spoke->LastErrorMessage() : "";
+  spoke->ConnectionClose();
+  if (!message.empty()) return Fail(message);
+  if (!written) return Fail("cannot write the output");
+  return 0;
+}
+
+void QuietSink(void*, int level, BATCHERR, const char* message) {
+  // Failures come back as results and are reported once by the command;
+  // layout differences and other warnings are shown as they happen.
+  if (level < 4) fprintf(stderr, "zqdb: warning: %s\n", message);
+}
+
+}  // namespace
+
+int ZqdbMain(int argc, char** argv) {
+  SetLogSink(QuietSink, nullptr);
+  Args args;
+  if (int rc = ParseArgs(argc, argv, &args)) return rc;
+  if (args.command == "info") return CmdInfo(args);
+  if (args.command == "cat") return CmdCat(args);
+  return Usage("unknown command " + args.command);
+}

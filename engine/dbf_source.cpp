@@ -1,0 +1,85 @@
+#include "engine/dbf_source.h"
+
+#include <cctype>
+#include <cstdio>
+#include <cstdlib>
+
+#include "host/zqutil.h"
+
+namespace {
+
+std::string Lower(const std::string& s) {
+  std::string out = s;
+  for (char& c : out) c = char(tolower(static_cast<unsigned char>(c)));
+  return out;
+}
+
+std::string Utf8(const wchar* w) {
+  ZQString s;
+  FormatMessage(s, u"%s", w);
+  return std::string(s.c_str(), size_t(s.length()));
+}
+
+}  // namespace
+
+bool ApplyDialect(ZQSpoke* spoke, const std::string& value) {
+  const ZQOptionDef* def = spoke->FindOptionDef("version");
+  if (def == nullptr) return false;
+  bool digits = !value.empty();
+  for (char c : value) digits = digits && isdigit(static_cast<unsigned char>(c));
+  if (digits) {
+    int n = atoi(value.c_str());
+    if (value.size() > 2 || n > 10) return false;
+    return spoke->SetOption("version", value.c_str()) == 0;
+  }
+  // The option's own value table: display names, case-blind.
+  std::string want = Lower(value);
+  for (int i = 0; i < def->ValueCount(); ++i) {
+    const OptionValueDef& v = def->Values()[i];
+    if (Lower(Utf8(v.display)) == want) return spoke->SetOption("version", v.value) == 0;
+  }
+  // Other products' names are accepted by the saved text form. Dialect 5 has
+  // no name, so it marks "nothing matched".
+  spoke->SetOption("version", "5");
+  ZQString text;
+  text += "version= ";
+  text += value.c_str();
+  text += "\n";
+  spoke->LoadOptions(text);
+  ZQString now;
+  spoke->GetOption("version", now);
+  if (atoi(now.c_str()) == 5) {
+    spoke->SetOption("version", "2");
+    return false;
+  }
+  return true;
+}
+
+BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePtr* out, std::string* error) {
+  SourcePtr spoke(NewFromDbase(ZQSpokeDef{}));
+  if (!spoke) {
+    *error = "out of memory";
+    return ZQ_NO_MEMORY;
+  }
+  if (!opts.dialect.empty() && !ApplyDialect(spoke.get(), opts.dialect)) {
+    *error = "unknown dialect: " + opts.dialect;
+    return ZQ_BAD_OPTIONS;
+  }
+  char buf[16];
+  snprintf(buf, sizeof buf, "%d", opts.codepage);
+  spoke->SetOption("codepage", buf);
+  snprintf(buf, sizeof buf, "%d", opts.memo_policy);
+  spoke->SetOption("ignorememoerr", buf);
+  ZQConnTarget target;
+  target.path = path.c_str();
+  BATCHERR rc = spoke->SetUserInfo(target);
+  if (rc == 0) rc = spoke->MakeFields();
+  if (rc != 0) {
+    const char* message = spoke->LastErrorMessage();
+    *error = message[0] ? message : "cannot open " + path;
+    spoke->ConnectionClose();
+    return rc;
+  }
+  *out = std::move(spoke);
+  return 0;
+}

@@ -1,0 +1,350 @@
+#include "engine/writers.h"
+
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <vector>
+
+namespace {
+
+bool IsNumericFamily(FIELDTYPE t) {
+  return t == FT_NUMERIC || t == FT_INTEGER || t == FT_FLOAT || t == FT_CURRENCY;
+}
+
+void PutDateTime(OutBuf& out, const ZQDateTime& dt) {
+  ZQString s;
+  dt.PrintIso(s);
+  out.Put(s.c_str(), size_t(s.length()));
+}
+
+// ---------------------------------------------------------------------------
+// CSV
+
+void PutCsvText(OutBuf& out, const char* s, size_t n) {
+  bool quote = false;
+  for (size_t i = 0; i < n; ++i) {
+    char c = s[i];
+    if (c == ',' || c == '"' || c == '\n' || c == '\r') {
+      quote = true;
+      break;
+    }
+  }
+  if (!quote) {
+    out.Put(s, n);
+    return;
+  }
+  out.Put('"');
+  size_t start = 0;
+  for (size_t i = 0; i < n; ++i) {
+    if (s[i] == '"') {
+      out.Put(s + start, i - start + 1);
+      out.Put('"');
+      start = i + 1;
+    }
+  }
+  out.Put(s + start, n - start);
+  out.Put('"');
+}
+
+class CsvWriter : public RecordWriter {
+ public:
+  explicit CsvWriter(OutBuf& out) : out_(out) {}
+  void Begin(const ZQRecord& layout) override {
+    for (int i = 0; i < layout.FieldCount(); ++i) {
+      if (i) out_.Put(',');
+      const char* name = layout[i]->Name();
+      PutCsvText(out_, name, strlen(name));
+    }
+    out_.Put("\r\n", 2);
+  }
+  void Row(ZQRecord& record) override {
+    int n = record.FieldCount();
+    for (int i = 0; i < n; ++i) {
+      if (i) out_.Put(',');
+      ZQField* f = record.GetFieldbyPos(i);
+      switch (f->held()) {
+        case ZQField::Held::kBlank: break;
+        case ZQField::Held::kText: {
+          const ZQString& s = f->StringRef();
+          PutCsvText(out_, s.c_str(), size_t(s.length()));
+          break;
+        }
+        case ZQField::Held::kLong: out_.PutInt(f->LongVal()); break;
+        case ZQField::Held::kDouble: out_.PutDouble(f->DoubleVal()); break;
+        case ZQField::Held::kDate: {
+          const ZQDate& d = f->DateRef();
+          out_.PutDate(d.Year(), d.Month(), d.Day());
+          break;
+        }
+        case ZQField::Held::kDateTime: PutDateTime(out_, f->DateTimeRef()); break;
+        case ZQField::Held::kBool: out_.Put(f->BoolVal() ? "true" : "false"); break;
+      }
+    }
+    out_.Put("\r\n", 2);
+  }
+
+ private:
+  OutBuf& out_;
+};
+
+// ---------------------------------------------------------------------------
+// JSON lines
+
+class JsonlWriter : public RecordWriter {
+ public:
+  explicit JsonlWriter(OutBuf& out) : out_(out) {}
+  void Begin(const ZQRecord& layout) override {
+    keys_.clear();
+    for (int i = 0; i < layout.FieldCount(); ++i) {
+      std::string key;
+      const char* name = layout[i]->Name();
+      key += i ? ",\"" : "{\"";
+      for (const char* p = name; *p; ++p) {
+        unsigned char c = static_cast<unsigned char>(*p);
+        if (c == '"' || c == '\\') key += '\\';
+        if (c < 0x20) {
+          char esc[8];
+          snprintf(esc, sizeof esc, "\\u%04x", c);
+          key += esc;
+          continue;
+        }
+        key += char(c);
+      }
+      key += "\":";
+      keys_.push_back(key);
+    }
+  }
+  void Row(ZQRecord& record) override {
+    int n = record.FieldCount();
+    if (n == 0) out_.Put('{');
+    for (int i = 0; i < n; ++i) {
+      out_.Put(keys_[size_t(i)].data(), keys_[size_t(i)].size());
+      ZQField* f = record.GetFieldbyPos(i);
+      switch (f->held()) {
+        case ZQField::Held::kBlank: out_.Put("null", 4); break;
+        case ZQField::Held::kText: {
+          const ZQString& s = f->StringRef();
+          if (IsNumericFamily(f->FieldType())) {
+            PutNumberText(s);
+          } else {
+            PutJsonString(out_, s.c_str(), size_t(s.length()));
+          }
+          break;
+        }
+        case ZQField::Held::kLong: out_.PutInt(f->LongVal()); break;
+        case ZQField::Held::kDouble: out_.PutDouble(f->DoubleVal()); break;
+        case ZQField::Held::kDate: {
+          const ZQDate& d = f->DateRef();
+          out_.Put('"');
+          out_.PutDate(d.Year(), d.Month(), d.Day());
+          out_.Put('"');
+          break;
+        }
+        case ZQField::Held::kDateTime:
+          out_.Put('"');
+          PutDateTime(out_, f->DateTimeRef());
+          out_.Put('"');
+          break;
+        case ZQField::Held::kBool: out_.Put(f->BoolVal() ? "true" : "false"); break;
+      }
+    }
+    out_.Put("}\n", 2);
+  }
+
+ private:
+  // A number held as the table's text: as it stands when JSON accepts it,
+  // else normalised through a double; text that is no number at all stays a
+  // string, so that nothing is lost.
+  void PutNumberText(const ZQString& s) {
+    const char* p = s.c_str();
+    size_t n = size_t(s.length());
+    if (IsJsonNumber(p, n)) {
+      out_.Put(p, n);
+      return;
+    }
+    char* end = nullptr;
+    double d = strtod(p, &end);
+    if (end == p + n && n > 0) {
+      out_.PutDouble(d);
+      return;
+    }
+    PutJsonString(out_, p, n);
+  }
+
+  OutBuf& out_;
+  std::vector<std::string> keys_;
+};
+
+// ---------------------------------------------------------------------------
+// Aligned table
+
+class TableWriter : public RecordWriter {
+ public:
+  explicit TableWriter(OutBuf& out) : out_(out) {}
+  void Begin(const ZQRecord& layout) override {
+    widths_.clear();
+    for (int i = 0; i < layout.FieldCount(); ++i) {
+      const ZQField* f = layout[i];
+      size_t w;
+      switch (f->FieldType()) {
+        case FT_DATE: w = 10; break;
+        case FT_DATETIME: w = 19; break;
+        case FT_BOOLEAN: w = 5; break;
+        case FT_INTEGER: w = 11; break;
+        case FT_FLOAT:
+        case FT_CURRENCY: w = 20; break;
+        default: w = size_t(f->Length()); break;
+      }
+      if (w > kMaxWidth) w = kMaxWidth;
+      size_t name_len = strlen(f->Name());
+      if (w < name_len) w = name_len;
+      widths_.push_back(w);
+    }
+    for (int i = 0; i < layout.FieldCount(); ++i) Cell(i, layout[i]->Name(), strlen(layout[i]->Name()));
+    out_.Put('\n');
+    for (int i = 0; i < layout.FieldCount(); ++i) {
+      if (i) out_.Put("  ", 2);
+      for (size_t k = 0; k < widths_[size_t(i)]; ++k) out_.Put('-');
+    }
+    out_.Put('\n');
+  }
+  void Row(ZQRecord& record) override {
+    for (int i = 0; i < record.FieldCount(); ++i) {
+      ZQField* f = record.GetFieldbyPos(i);
+      ZQString text;
+      switch (f->held()) {
+        case ZQField::Held::kBlank: break;
+        case ZQField::Held::kDate: {
+          const ZQDate& d = f->DateRef();
+          char buf[16];
+          snprintf(buf, sizeof buf, "%04d-%02d-%02d", d.Year(), d.Month(), d.Day());
+          text = buf;
+          break;
+        }
+        case ZQField::Held::kBool: text = f->BoolVal() ? "true" : "false"; break;
+        case ZQField::Held::kDateTime: f->DateTimeRef().PrintIso(text); break;
+        case ZQField::Held::kDouble: {
+          char buf[40];
+          snprintf(buf, sizeof buf, "%.15g", f->DoubleVal());
+          text = buf;
+          break;
+        }
+        default: f->RenderText(text, 0); break;
+      }
+      // One line per record: line breaks inside a value are shown as spaces.
+      std::string shown(text.c_str(), size_t(text.length()));
+      for (char& c : shown)
+        if (c == '\n' || c == '\r' || c == '\t') c = ' ';
+      Cell(i, shown.data(), shown.size());
+    }
+    out_.Put('\n');
+  }
+
+ private:
+  static constexpr size_t kMaxWidth = 40;
+
+  void Cell(int i, const char* s, size_t n) {
+    size_t w = widths_[size_t(i)];
+    if (i) out_.Put("  ", 2);
+    if (n > w) {
+      out_.Put(s, w > 3 ? w - 3 : w);
+      if (w > 3) out_.Put("...", 3);
+      return;
+    }
+    out_.Put(s, n);
+    if (size_t(i) + 1 < widths_.size())
+      for (size_t k = n; k < w; ++k) out_.Put(' ');
+  }
+
+  OutBuf& out_;
+  std::vector<size_t> widths_;
+};
+
+}  // namespace
+
+bool ParseFormat(const std::string& name, OutputFormat* out) {
+  if (name == "csv") *out = OutputFormat::kCsv;
+  else if (name == "jsonl" || name == "json") *out = OutputFormat::kJsonl;
+  else if (name == "table") *out = OutputFormat::kTable;
+  else return false;
+  return true;
+}
+
+std::unique_ptr<RecordWriter> MakeWriter(OutputFormat format, OutBuf& out) {
+  switch (format) {
+    case OutputFormat::kJsonl: return std::make_unique<JsonlWriter>(out);
+    case OutputFormat::kTable: return std::make_unique<TableWriter>(out);
+    default: return std::make_unique<CsvWriter>(out);
+  }
+}
+
+void PutJsonString(OutBuf& out, const char* s, size_t n) {
+  out.Put('"');
+  const auto* p = reinterpret_cast<const unsigned char*>(s);
+  size_t start = 0;
+  for (size_t i = 0; i < n;) {
+    unsigned char c = p[i];
+    if (c >= 0x20 && c != '"' && c != '\\' && c < 0x80) {
+      ++i;
+      continue;
+    }
+    if (c >= 0x80) {
+      int extra = c >= 0xF0 && c < 0xF5 ? 3 : c >= 0xE0 && c < 0xF0 ? 2 : c >= 0xC2 && c < 0xE0 ? 1 : 0;
+      bool ok = extra > 0 && i + size_t(extra) < n;
+      for (int k = 1; ok && k <= extra; ++k) ok = (p[i + size_t(k)] & 0xC0) == 0x80;
+      if (ok) {
+        i += size_t(extra) + 1;
+        continue;
+      }
+      out.Put(s + start, i - start);
+      char esc[8];
+      snprintf(esc, sizeof esc, "\\u%04x", c);  // not UTF-8: the byte as Latin-1
+      out.Put(esc, 6);
+      start = ++i;
+      continue;
+    }
+    out.Put(s + start, i - start);
+    switch (c) {
+      case '"': out.Put("\\\"", 2); break;
+      case '\\': out.Put("\\\\", 2); break;
+      case '\n': out.Put("\\n", 2); break;
+      case '\r': out.Put("\\r", 2); break;
+      case '\t': out.Put("\\t", 2); break;
+      default: {
+        char esc[8];
+        snprintf(esc, sizeof esc, "\\u%04x", c);
+        out.Put(esc, 6);
+      }
+    }
+    start = ++i;
+  }
+  out.Put(s + start, n - start);
+  out.Put('"');
+}
+
+bool IsJsonNumber(const char* s, size_t n) {
+  size_t i = 0;
+  if (i < n && s[i] == '-') ++i;
+  if (i >= n) return false;
+  if (s[i] == '0') {
+    ++i;
+  } else if (s[i] >= '1' && s[i] <= '9') {
+    while (i < n && s[i] >= '0' && s[i] <= '9') ++i;
+  } else {
+    return false;
+  }
+  if (i < n && s[i] == '.') {
+    ++i;
+    size_t d = i;
+    while (i < n && s[i] >= '0' && s[i] <= '9') ++i;
+    if (i == d) return false;
+  }
+  if (i < n && (s[i] == 'e' || s[i] == 'E')) {
+    ++i;
+    if (i < n && (s[i] == '+' || s[i] == '-')) ++i;
+    size_t d = i;
+    while (i < n && s[i] >= '0' && s[i] <= '9') ++i;
+    if (i == d) return false;
+  }
+  return i == n;
+}

@@ -75,6 +75,8 @@ class ZQOptionDef {
   const wchar* Description() const { return description_; }
   int Flags() const { return flags_; }
   const char* Default() const { return default_; }
+  const wchar* WideDefault() const { return wide_default_; }
+  bool HasWideAccessors() const { return wgetter_ != nullptr || wsetter_ != nullptr; }
   const OptionValueDef* Values() const { return values_; }
   int ValueCount() const { return value_count_; }
   BATCHERR Get(void* block, ZQString& value) const;

@@ -1,0 +1,57 @@
+# Entry points: `make demo` and `make test` set up, build and run on a fresh
+# machine. Missing Debian packages are installed with apt-get when running as
+# root; otherwise the exact install line is printed and make stops.
+
+BUILD      ?= build
+SAN_BUILD  ?= build-san
+FUZZ_TIME  ?= 20
+JOBS       ?= $(shell nproc 2>/dev/null || echo 2)
+
+# What each package is for: see README.md, "Dependencies".
+PACKAGES = cmake ninja-build g++ clang libclang-rt-14-dev libgtest-dev python3 \
+           python3-dbfread python3-dbf libdbd-xbase-perl shapelib gdal-bin pgdbf
+
+.PHONY: all setup build demo test test-unit test-sanitize bench clean
+
+all: build
+
+setup:
+	@missing=""; \
+	for p in $(PACKAGES); do \
+	  dpkg-query -W -f='$${Status}' $$p 2>/dev/null | grep -q "install ok installed" || missing="$$missing $$p"; \
+	done; \
+	if [ -n "$$missing" ]; then \
+	  if [ "$$(id -u)" = 0 ]; then \
+	    echo "installing:$$missing"; \
+	    apt-get update -qq && DEBIAN_FRONTEND=noninteractive apt-get install -y -qq$$missing >/dev/null || exit 1; \
+	  else \
+	    echo "missing packages; run:"; echo "  sudo apt-get install -y$$missing"; exit 1; \
+	  fi; \
+	fi
+
+build: setup
+	cmake -S . -B $(BUILD) -G Ninja -DCMAKE_BUILD_TYPE=RelWithDebInfo >/dev/null
+	ninja -C $(BUILD) -j $(JOBS)
+
+demo: build
+	$(BUILD)/zqdb info examples/customers.dbf
+	@echo
+	$(BUILD)/zqdb cat examples/customers.dbf --codepage 850 --format table
+
+test: build
+	ctest --test-dir $(BUILD) --output-on-failure -j $(JOBS)
+	$(MAKE) --no-print-directory test-sanitize
+
+# Unit tests under AddressSanitizer and UndefinedBehaviorSanitizer, and every
+# libFuzzer target for a bounded time, all built with clang.
+test-sanitize: setup
+	CXX=clang++ cmake -S . -B $(SAN_BUILD) -G Ninja -DZQ_SANITIZE=ON -DZQ_FUZZ=ON \
+	  -DZQ_FUZZ_TIME=$(FUZZ_TIME) -DCMAKE_BUILD_TYPE=Debug >/dev/null
+	ninja -C $(SAN_BUILD) -j $(JOBS)
+	ctest --test-dir $(SAN_BUILD) --output-on-failure -L 'unit|fuzz-smoke' -j $(JOBS)
+
+bench: build
+	bench/run.sh $(BUILD)/zqdb
+
+clean:
+	rm -rf $(BUILD) $(SAN_BUILD)

@@ -4,6 +4,7 @@
 
 #include <cstring>
 
+#include "host/bytescan.h"
 #include "host/endian.h"
 #include "host/zqdate.h"
 #include "host/zqglob.h"
@@ -135,24 +136,27 @@ BATCHERR ZQDbase::GetRecord(ZQRecord& record, int32_t n, int64_t* position, bool
     const int32_t length = fd->length;
     if (offset + length > room)
       return OwnerSpoke()->LogError(4, ZQ_READ_ERROR, lgettext(u"Field %d extends beyond end of record"), i);
-    FieldText.CopyN(RecordBuffer, length, offset);
-    const auto* bytes = reinterpret_cast<const uint8_t*>(RecordBuffer + offset);
+    const char* raw = RecordBuffer + offset;
+    const auto* bytes = reinterpret_cast<const uint8_t*>(raw);
     switch (fd->type) {
       case 'M':
       case 'G':
       memo:
+        FieldText.CopyN(raw, length, 0);
         if (BATCHERR rc = GetMemoField(field, FieldText, withInfo); rc != 0) return rc;
         break;
       case 'B':
         if (!vfp) goto memo;
         {
           double d;
+          FieldText.CopyN(raw, length, 0);
           field->DataType().Input(FieldText, 0, d);
           *field = d;
         }
         break;
       case 'T': {
         int32_t day = 0, ms = 0;
+        FieldText.CopyN(raw, length, 0);
         BinaryLong.Input(FieldText, 0, day);
         BinaryLong.Input(FieldText, 4, ms);
         // Widened so that a damaged day number can't overflow.
@@ -162,6 +166,7 @@ BATCHERR ZQDbase::GetRecord(ZQRecord& record, int32_t n, int64_t* position, bool
       }
       case 'I': {
         int32_t v = 0;
+        FieldText.CopyN(raw, length, 0);
         field->DataType().Input(FieldText, 0, v);
         *field = v;
         break;
@@ -174,11 +179,20 @@ BATCHERR ZQDbase::GetRecord(ZQRecord& record, int32_t n, int64_t* position, bool
         *field = double(int64_t(raw)) / 10000.0;
         break;
       }
-      default:
-        FieldText.StripChars(false, true, ' ');
-        if (codepage != 0) ZQGlob::ExternalToInternal(codepage, FieldText);
-        *field = FieldText;
+      default: {
+        // Trailing blanks go; they are cut on the record's bytes, so that the
+        // text is copied once, and straight into the field when no code page
+        // conversion stands between.
+        int32_t kept = int32_t(bytescan::TrimRight(raw, size_t(length), ' '));
+        if (codepage != 0) {
+          FieldText.CopyN(raw, kept, 0);
+          ZQGlob::ExternalToInternal(codepage, FieldText);
+          *field = FieldText;
+        } else {
+          field->AssignText(raw, kept);
+        }
         break;
+      }
     }
     offset += length;
   }

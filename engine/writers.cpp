@@ -1,5 +1,7 @@
 #include "engine/writers.h"
 
+#include "host/bytescan.h"
+
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -21,15 +23,16 @@ void PutDateTime(OutBuf& out, const ZQDateTime& dt) {
 // CSV
 
 void PutCsvText(OutBuf& out, const char* s, size_t n) {
-  bool quote = false;
-  for (size_t i = 0; i < n; ++i) {
-    char c = s[i];
-    if (c == ',' || c == '"' || c == '\n' || c == '\r') {
-      quote = true;
-      break;
+  if (n < OutBuf::kSize / 2) {
+    // Copy first, then test the copy: the buffer has slack behind the value,
+    // so whole 16-byte blocks can be read without running off anything.
+    char* d = out.Reserve(n + 16);
+    memcpy(d, s, n);
+    if (!bytescan::HasCsvSpecialPadded(d, n)) {
+      out.Commit(n);
+      return;
     }
-  }
-  if (!quote) {
+  } else if (!bytescan::HasCsvSpecial(s, n)) {
     out.Put(s, n);
     return;
   }

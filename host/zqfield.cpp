@@ -1,5 +1,7 @@
 #include "host/zqfield.h"
 
+#include "host/bytescan.h"
+
 #include <cmath>
 #include <cstdio>
 #include <cstdlib>
@@ -25,32 +27,29 @@ int32_t ZQField::DisplayLength() const {
   return type_.Length();
 }
 
-void ZQField::Blank() {
-  held_ = Held::kBlank;
-  text_.SetLength(0);
-}
+void ZQField::operator=(const ZQString& text) { AssignText(text.c_str(), text.length()); }
 
-void ZQField::operator=(const ZQString& text) {
+void ZQField::AssignText(const char* p, int32_t n) {
   switch (type_.Family()) {
     case FT_NUMERIC:
     case FT_INTEGER:
     case FT_FLOAT:
-    case FT_CURRENCY: AssignNumberText(text); return;
-    case FT_DATE: AssignDateText(text); return;
-    case FT_BOOLEAN: AssignBoolText(text); return;
+    case FT_CURRENCY: AssignNumberText(p, n); return;
+    case FT_DATE: AssignDateText(p, n); return;
+    case FT_BOOLEAN: AssignBoolText(p, n); return;
     default:
-      text_.CopyN(text.c_str(), text.length(), 0);
+      text_.CopyN(p, n, 0);
       held_ = Held::kText;
       return;
   }
 }
 
-void ZQField::AssignNumberText(const ZQString& text) {
+void ZQField::AssignNumberText(const char* p, int32_t n) {
   // Numbers keep their digits: leading blanks go, the rest is parsed on demand.
-  const char* p = text.c_str();
-  int32_t n = text.length();
-  while (n > 0 && *p == ' ') ++p, --n;
-  while (n > 0 && p[n - 1] == ' ') --n;
+  int32_t lead = int32_t(bytescan::SkipLeft(p, size_t(n), ' '));
+  p += lead;
+  n -= lead;
+  n = int32_t(bytescan::TrimRight(p, size_t(n), ' '));
   if (n == 0) {
     Blank();
     return;
@@ -59,9 +58,22 @@ void ZQField::AssignNumberText(const ZQString& text) {
   held_ = Held::kText;
 }
 
-void ZQField::AssignDateText(const ZQString& text) {
-  const char* p = text.c_str();
-  int32_t n = text.length();
+void ZQField::AssignDateText(const char* p, int32_t n) {
+  if (n == 8) {  // the usual case first: eight digits of a real date
+    uint32_t v[8];
+    bool digits = true;
+    for (int i = 0; i < 8; ++i) {
+      v[i] = uint32_t(uint8_t(p[i]) - '0');
+      digits = digits && v[i] <= 9;
+    }
+    int32_t y = int32_t(v[0] * 1000 + v[1] * 100 + v[2] * 10 + v[3]);
+    int32_t m = int32_t(v[4] * 10 + v[5]);
+    int32_t d = int32_t(v[6] * 10 + v[7]);
+    if (digits && IsValidDate(y, m, d)) {
+      SetDate(y, m, d);
+      return;
+    }
+  }
   bool empty = true;
   for (int32_t i = 0; i < n; ++i)
     if (p[i] != ' ' && p[i] != '0' && p[i] != '\0') empty = false;
@@ -69,30 +81,13 @@ void ZQField::AssignDateText(const ZQString& text) {
     Blank();
     return;
   }
-  if (n == 8) {
-    int32_t v[8];
-    bool digits = true;
-    for (int i = 0; i < 8; ++i) {
-      v[i] = p[i] - '0';
-      if (v[i] < 0 || v[i] > 9) digits = false;
-    }
-    if (digits) {
-      int32_t y = v[0] * 1000 + v[1] * 100 + v[2] * 10 + v[3];
-      int32_t m = v[4] * 10 + v[5];
-      int32_t d = v[6] * 10 + v[7];
-      if (IsValidDate(y, m, d)) {
-        SetDate(y, m, d);
-        return;
-      }
-    }
-  }
   // Not a date: keep the bytes so that nothing is lost.
   text_.CopyN(p, n, 0);
   held_ = Held::kText;
 }
 
-void ZQField::AssignBoolText(const ZQString& text) {
-  char c = text.length() > 0 ? text[0] : ' ';
+void ZQField::AssignBoolText(const char* p, int32_t n) {
+  char c = n > 0 ? p[0] : ' ';
   if (c == 'T' || c == 't' || c == 'Y' || c == 'y') SetBool(true);
   else if (c == 'F' || c == 'f' || c == 'N' || c == 'n') SetBool(false);
   else Blank();  // '?' and blank: not set
@@ -151,13 +146,11 @@ const ZQDate& ZQField::DateRef() {
   return date_;
 }
 
-const ZQString& ZQField::StringRef() {
-  if (held_ != Held::kText) {
-    ZQString out;
-    RenderText(out, 1);
-    text_ = out;
-  }
-  return text_;
+void ZQField::RenderInto(ZQString& text) {
+  // The value's text form replaces the buffer; the value itself stays held.
+  ZQString out;
+  RenderText(out, 1);
+  text = out;
 }
 
 void ZQField::RenderText(ZQString& out, int flag) {

@@ -31,12 +31,15 @@ class ZQField {
   ZQField& operator=(const ZQField&) = delete;
 
   void operator=(const ZQString& text);
+  // The same as assigning a ZQString of those bytes, without building one.
+  void AssignText(const char* p, int32_t n);
   void operator=(int32_t value);
   void operator=(double value);
   void operator=(const ZQDateTime& value);
   void SetDate(int32_t year, int32_t month, int32_t day);
   void SetBool(bool value);
-  void Blank();
+  // Blanks the value; the text buffer keeps its room for the next value.
+  void Blank() { held_ = Held::kBlank; }
 
   void Name(const char* name);
   const char* Name() const { return name_.c_str(); }
@@ -58,7 +61,10 @@ class ZQField {
   const ZQDateTime& DateTimeRef() const { return datetime_; }
   // The value's text form (by RenderText with flag 1); for text and numbers
   // held as text, the text itself.
-  const ZQString& StringRef();
+  const ZQString& StringRef() {
+    if (held_ != Held::kText) RenderInto(text_);
+    return text_;
+  }
 
   ZQFieldInfo* GetFieldInfo() const { return info_; }
   // Takes `info` over; the caller deletes the old one first.
@@ -70,9 +76,10 @@ class ZQField {
   virtual void SetPicture(const char* picture) { type_.Picture(picture); }
 
  private:
-  void AssignNumberText(const ZQString& text);
-  void AssignDateText(const ZQString& text);
-  void AssignBoolText(const ZQString& text);
+  void RenderInto(ZQString& text);
+  void AssignNumberText(const char* p, int32_t n);
+  void AssignDateText(const char* p, int32_t n);
+  void AssignBoolText(const char* p, int32_t n);
 
   ZQDType type_;
   ZQString name_;

@@ -178,7 +178,7 @@ bool ZQString::CopyN(const ZQString& s, int32_t length, int32_t from) {
   return CopyN(s.c_str(), length, from);
 }
 
-bool ZQString::CopyN(const char* s, int32_t length, int32_t from) {
+bool ZQString::CopyNSlow(const char* s, int32_t length, int32_t from) {
   if (length < 0 || from < 0) return false;
   if (!Reserve(length)) return false;
   if (length > 0) memmove(data_, s + from, size_t(length));

@@ -8,6 +8,7 @@
 #pragma once
 
 #include <cstdint>
+#include <cstring>
 
 #include "host/zqtypes.h"
 
@@ -53,7 +54,16 @@ class ZQString {
   bool Append(const char* s, int32_t length);
   // Replaces the content with `length` bytes of `s` from `from`.
   bool CopyN(const ZQString& s, int32_t length, int32_t from);
-  bool CopyN(const char* s, int32_t length, int32_t from);
+  bool CopyN(const char* s, int32_t length, int32_t from) {
+    // Fast path of the record loop: the buffer is already large enough.
+    if (data_ != nullptr && length >= 0 && length <= cap_ && from >= 0) {
+      memmove(data_, s + from, size_t(length));
+      len_ = length;
+      data_[len_] = '\0';
+      return true;
+    }
+    return CopyNSlow(s, length, from);
+  }
   void Replace(int32_t position, char c);
   void ToUpper();
   void ToLower();
@@ -77,6 +87,7 @@ class ZQString {
  private:
   friend bool NextKeyword(char* keyword, ZQString& text);
   bool Reserve(int32_t n);  // capacity for n bytes of content plus the NUL
+  bool CopyNSlow(const char* s, int32_t length, int32_t from);
 
   char* data_ = nullptr;
   int32_t len_ = 0;

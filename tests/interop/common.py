@@ -1,0 +1,180 @@
+"""Shared helpers of the interop tests.
+
+Each test script writes tables with an independent program (python3-dbf,
+Perl XBase, shapelib, GDAL), reads them back through `zqdb cat --format jsonl`
+and through python3-dbfread, and checks that both readers see the same fields
+and the same live records, value for value. Run as
+
+    /usr/bin/python3 test_x.py PATH_TO_ZQDB
+
+The Debian modules (dbf, dbfread) live in the system Python only.
+"""
+
+import contextlib
+import datetime
+import decimal
+import json
+import math
+import os
+import subprocess
+import sys
+import tempfile
+
+import dbfread
+
+ZQDB = os.path.abspath(sys.argv[1]) if len(sys.argv) > 1 else "zqdb"
+
+
+def run(cmd, **kw):
+    """Runs a command; returns (exit status, stdout text, stderr text)."""
+    p = subprocess.run(cmd, capture_output=True, timeout=60, **kw)
+    return p.returncode, p.stdout.decode("utf-8", "replace"), p.stderr.decode("utf-8", "replace")
+
+
+def zqdb_rows(table, *opts):
+    """The live records as zqdb prints them in JSON lines, numbers as Decimal."""
+    rc, out, err = run([ZQDB, "cat", table, "--format", "jsonl", *opts])
+    if rc != 0:
+        raise AssertionError("zqdb cat %s %s: exit %d: %s" % (os.path.basename(table), " ".join(opts), rc, err.strip()))
+    return [json.loads(line, parse_float=decimal.Decimal) for line in out.splitlines()]
+
+
+def zqdb_fields(table, *opts):
+    """(name, type letter, width, decimals) of each field from `zqdb info`."""
+    rc, out, err = run([ZQDB, "info", table, *opts])
+    if rc != 0:
+        raise AssertionError("zqdb info %s: exit %d: %s" % (os.path.basename(table), rc, err.strip()))
+    fields, in_list = [], False
+    for line in out.splitlines():
+        if line.strip().startswith("#") and "name" in line:
+            in_list = True
+            continue
+        if in_list:
+            num, name, letter, width, dec = line.split()
+            fields.append((name, letter, int(width), int(dec)))
+    return fields
+
+
+def dbfread_table(table, encoding="ascii"):
+    return dbfread.DBF(table, encoding=encoding, char_decode_errors="strict", load=False,
+                        ignore_missing_memofile=True)
+
+
+def dbfread_fields(table, encoding="ascii"):
+    t = dbfread_table(table, encoding)
+    return [(f.name, f.type, f.length, f.decimal_count) for f in t.fields]
+
+
+def dbfread_rows(table, encoding="ascii"):
+    return [dict(r) for r in dbfread_table(table, encoding)]
+
+
+# --- value comparison --------------------------------------------------------
+
+def _num(v):
+    if isinstance(v, bool):
+        raise TypeError("a boolean where a number belongs")
+    return v if isinstance(v, int) else float(v)
+
+
+def same_number(zq, ref):
+    if zq is None or ref is None:
+        return zq is None and ref is None
+    if isinstance(zq, str):  # text that is no number
+        return False
+    a, b = _num(zq), _num(ref)
+    if isinstance(a, int) and isinstance(b, int):
+        return a == b
+    return math.isclose(float(a), float(b), rel_tol=1e-12, abs_tol=1e-9)
+
+
+def datetime_as_zqdb(ref):
+    """zqdb shows a date-time to the second: the millisecond count plus one,
+    divided by 1000 in integers (so 999 ms rounds up, 998 ms down)."""
+    if ref is None:
+        return None
+    ms = ref.microsecond // 1000
+    base = ref.replace(microsecond=0)
+    return (base + datetime.timedelta(seconds=(ms + 1) // 1000)).isoformat()
+
+
+def same_value(letter, zq, ref):
+    """True when zqdb's JSON value `zq` equals dbfread's `ref` for a field of
+    type `letter` (for B: the dialect-10 double)."""
+    if letter in "NFIYB":
+        return same_number(zq, ref)
+    if letter == "D":
+        return zq == (ref.isoformat() if ref is not None else None)
+    if letter == "T":
+        return zq == datetime_as_zqdb(ref)
+    if letter == "L":
+        return zq is ref
+    if letter == "M":  # no memo and an empty one are the same to both readers
+        return (zq or None) == (ref or None)
+    return zq == ref
+
+
+class Suite:
+    """A group of named checks; prints one line per failure and a summary."""
+
+    def __init__(self, name):
+        self.name = name
+        self.passed = 0
+        self.failed = 0
+
+    def check(self, label, ok, detail=""):
+        if ok:
+            self.passed += 1
+        else:
+            self.failed += 1
+            print("FAIL %s: %s%s" % (self.name, label, (": " + detail) if detail else ""))
+        return ok
+
+    @contextlib.contextmanager
+    def case(self, label):
+        """Runs a block as one check; an exception fails that check only."""
+        try:
+            yield
+        except Exception as e:  # noqa: BLE001 - any failure of the block is reported
+            self.check(label, False, "%s: %s" % (type(e).__name__, e))
+
+    def compare_table(self, label, table, zq_opts=(), encoding="ascii", ref_fix=None, expect_live=None):
+        """zqdb and dbfread agree on the fields and on every live record of
+        `table`. `ref_fix(field_name, value)` corrects a known quirk of dbfread
+        before comparing. Returns zqdb's rows."""
+        with self.case(label):
+            zf = zqdb_fields(table, *zq_opts)
+            rf = dbfread_fields(table, encoding)
+            self.check(label + " fields", zf == rf, "zqdb %s, dbfread %s" % (zf, rf))
+            zrows = zqdb_rows(table, *zq_opts)
+            rrows = dbfread_rows(table, encoding)
+            if ref_fix:
+                rrows = [{k: ref_fix(k, v) for k, v in r.items()} for r in rrows]
+            if expect_live is not None:
+                self.check(label + " live count", len(zrows) == expect_live,
+                           "zqdb %d, expected %d" % (len(zrows), expect_live))
+            self.check(label + " record count", len(zrows) == len(rrows),
+                       "zqdb %d, dbfread %d" % (len(zrows), len(rrows)))
+            letters = {f[0]: f[1] for f in rf}
+            bad = []
+            for i, (z, r) in enumerate(zip(zrows, rrows)):
+                if list(z.keys()) != list(r.keys()):
+                    bad.append("record %d keys %s vs %s" % (i, list(z.keys()), list(r.keys())))
+                    continue
+                for k in r:
+                    if not same_value(letters[k], z[k], r[k]):
+                        bad.append("record %d %s: zqdb %r, dbfread %r" % (i, k, z[k], r[k]))
+            self.check(label + " values", not bad, "; ".join(bad[:8]) + (" ..." if len(bad) > 8 else ""))
+            return zrows
+        return []
+
+    def done(self):
+        print("%s: %d passed, %d failed" % (self.name, self.passed, self.failed))
+        sys.exit(1 if self.failed else 0)
+
+
+@contextlib.contextmanager
+def workdir():
+    """A temporary directory, removed afterwards; yields its path."""
+    with tempfile.TemporaryDirectory(prefix="zqdb-interop-") as d:
+        yield d

@@ -1,0 +1,60 @@
+"""Tables written by shapelib (dbfcreate, dbfadd) and by GDAL (ogr2ogr from
+CSV), read alike by zqdb and dbfread."""
+
+import os
+import sys
+
+sys.path.insert(0, os.path.dirname(os.path.abspath(__file__)))
+from common import Suite, run, workdir  # noqa: E402
+
+s = Suite("shapelib_gdal")
+
+
+def must(cmd):
+    rc, out, err = run(cmd)
+    if rc != 0:
+        raise AssertionError("%s: exit %d: %s" % (cmd[0], rc, err.strip()))
+
+
+with workdir() as d:
+    # shapelib: dbfadd stores the text bytes it is given (UTF-8 here) and
+    # keeps leading blanks. zqdb without a code page passes bytes through.
+    shp = os.path.join(d, "shape.dbf")
+    with s.case("shapelib write"):
+        must(["dbfcreate", shp, "-s", "NAME", "24", "-n", "QTY", "6", "0", "-n", "PRICE", "12", "3",
+              "-s", "CODE", "3"])
+        for row in (["  lead", "12", "3.25", "A"], ["Müller, \"Zoë\"", "-4", "-0.5", "B"],
+                    ["東京", "0", "0", ""], ["x" * 24, "999999", "99999999.999", "xyz"]):
+            must(["dbfadd", shp] + row)
+    rows = s.compare_table("shapelib", shp, [], "utf-8", expect_live=4)
+    if rows:
+        s.check("shapelib leading blanks kept", rows[0]["NAME"] == "  lead", repr(rows[0]["NAME"]))
+        s.check("shapelib UTF-8 text", rows[1]["NAME"] == "Müller, \"Zoë\"" and rows[2]["NAME"] == "東京",
+                repr([r["NAME"] for r in rows]))
+
+    # GDAL: CSV to DBF with type detection (integer, real and date columns)
+    # and the text in code page 1252.
+    csv = os.path.join(d, "in.csv")
+    with open(csv, "w", encoding="utf-8") as f:
+        f.write("id,name,amount,born,city\n"
+                "1,  Zoë,12.5,2001-02-03,Århus\n"
+                "2,\"a, \"\"q\"\"\",-3,1999-12-31,Köln\n"
+                "3,Ærø ,1e3,1970-01-01,\n"
+                "4,€ 5,0.001,2024-02-29,São Paulo\n")
+    gdal = os.path.join(d, "gdal.dbf")
+    with s.case("ogr2ogr typed"):
+        must(["ogr2ogr", "-f", "ESRI Shapefile", "-oo", "AUTODETECT_TYPE=YES", "-lco", "ENCODING=CP1252",
+              gdal, csv])
+    rows = s.compare_table("GDAL typed cp1252", gdal, ["--codepage", "1252"], "cp1252", expect_live=4)
+    if rows:
+        s.check("GDAL text", [r["city"] for r in rows] == ["Århus", "Köln", "", "São Paulo"],
+                repr([r["city"] for r in rows]))
+        s.check("GDAL dates", rows[3]["born"] == "2024-02-29", repr(rows[3]["born"]))
+
+    # Without type detection every column is text, 80 wide.
+    plain = os.path.join(d, "plain.dbf")
+    with s.case("ogr2ogr plain"):
+        must(["ogr2ogr", "-f", "ESRI Shapefile", "-lco", "ENCODING=CP1252", plain, csv])
+    s.compare_table("GDAL text columns", plain, ["--codepage", "1252"], "cp1252", expect_live=4)
+
+s.done()

@@ -8,14 +8,16 @@ int dbclose(ZQDBFIELD** fields, ZQDBFILE* db) {
   if (db == nullptr) return -1;
   // The memo file is closed whether it opened or not (a failed memo leaves a
   // closed object), so the table file never stays open behind a memo failure.
-  if (db->hasmemo && db->memofile.isOpen()) db->memofile.close(true);
+  // Memo bytes still buffered are written now; a failure there counts as a
+  // failed close like one of the table file.
+  int rc = 0;
+  if (db->hasmemo && db->memofile.isOpen() && db->memofile.close(true) != 0) rc = -1;
   if (fields != nullptr) {
     for (int i = 0; i < kMaxFields && fields[i] != nullptr; ++i) {
       delete fields[i];
       fields[i] = nullptr;
     }
   }
-  int rc = 0;
   ZQFileProxy& f = db->datafile;
   if (db->changed && f.isOpen()) {
     f.clearErrors();

@@ -159,6 +159,25 @@ void dbdate(char* day, char* month, char* year);
 // upper-cased, all else '_', zero-filled to 11 bytes.
 void dbname(const char* src, char* dst);
 
+// Creates an empty table `name` (full path with extension) with `count`
+// descriptors, and its memo file when bit 15 of `version` is set (the low 15
+// bits are the dialect). Names are NUL-padded to 11 bytes in place.
+// `production` fills byte 28 of the wide header. 0, or -1; nothing is
+// cleaned up on failure.
+int dbcreat(const char* name, int count, ZQDBFIELD** fields, int version, bool production);
+// Writes physical record `number` (from 0; the count appends) from `record`
+// (reclen - 1 bytes) with flag 0x20 if `live`, else 0x2A. 0, or -1 (a number
+// above the count, a count the header can't hold, or a failed write).
+int dbput(ZQDBFILE* db, const char* record, int32_t number, int live);
+// Removes the table `name` and, if `hasmemo`, its memo file of `memokind`.
+// 0, or -1 when a file could not be removed.
+int dbdelete(const char* name, bool hasmemo, char memokind);
+
+// Header writers of dbcreat: the narrow and the wide form, with descriptors
+// and terminators. 0, or -1 when the file reports a write error.
+int dbhdr2(ZQFileProxy& f, int count, ZQDBFIELD** fields, uint8_t version);
+int dbhdr3(ZQFileProxy& f, int count, ZQDBFIELD** fields, uint8_t version, bool production);
+
 // Header readers of dbopen; the position is offset 1. 0, or -1 refused.
 int dbreadhdr2(ZQDBFILE* db, ZQDBFIELD** fields);
 int dbreadhdr3(ZQDBFILE* db, ZQDBFIELD** fields);

@@ -196,7 +196,9 @@ void FormatMessageV(ZQString& out, const wchar* format, va_list args) {
   for (size_t i = 0; format[i];) {
     wchar c = format[i++];
     if (c != '%') {
-      wchar one[2] = {c, 0};
+      // A surrogate pair goes out whole, as one 4-byte UTF-8 character.
+      wchar one[3] = {c, 0, 0};
+      if (c >= 0xD800 && c < 0xDC00 && format[i] >= 0xDC00 && format[i] < 0xE000) one[1] = format[i++];
       AppendWide(out, one);
       continue;
     }

@@ -1,0 +1,126 @@
+// Test helpers for the read path: a per-process scratch directory, a capture
+// of logged messages, and a source spoke driven the way the engine drives it
+// (factory, options, SetUserInfo, MakeFields, GetRecord until 1,
+// ConnectionClose, DeleteFromDbase).
+#pragma once
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstdlib>
+#include <string>
+#include <vector>
+
+#include "connector/frdbase.h"
+#include "host/zqutil.h"
+#include "tests/support/dbf_builder.h"
+
+namespace tests {
+
+// A path in a directory of this process alone: the test programs (and the
+// sanitizer build) run side by side, and each would otherwise overwrite the
+// others' files. The directory goes when the process ends.
+inline std::string ScratchPath(const std::string& name) {
+  static const std::string dir = [] {
+    std::string d = "/tmp/zqdbse-read-" + std::to_string(getpid());
+    mkdir(d.c_str(), 0700);
+    static std::string to_remove = d;
+    atexit([] {
+      std::string rm = "rm -rf '" + to_remove + "'";
+      if (system(rm.c_str()) != 0) {
+      }
+    });
+    return d;
+  }();
+  return dir + "/" + name;
+}
+
+inline std::string WriteScratch(const std::string& name, const Bytes& bytes) {
+  std::string path = ScratchPath(name);
+  FILE* f = fopen(path.c_str(), "wb");
+  if (f == nullptr) return "";
+  if (!bytes.empty()) fwrite(bytes.data(), 1, bytes.size(), f);
+  fclose(f);
+  return path;
+}
+
+// Collects what the host's log sink receives while the object lives.
+class LogCapture {
+ public:
+  struct Entry {
+    int level;
+    BATCHERR code;
+    std::string message;
+  };
+  LogCapture() { SetLogSink(&Sink, this); }
+  ~LogCapture() { SetLogSink(nullptr, nullptr); }
+  LogCapture(const LogCapture&) = delete;
+  LogCapture& operator=(const LogCapture&) = delete;
+
+  const std::vector<Entry>& entries() const { return entries_; }
+  std::string Last() const { return entries_.empty() ? "" : entries_.back().message; }
+  void Clear() { entries_.clear(); }
+
+ private:
+  static void Sink(void* context, int level, BATCHERR code, const char* message) {
+    static_cast<LogCapture*>(context)->entries_.push_back({level, code, message ? message : ""});
+  }
+  std::vector<Entry> entries_;
+};
+
+// A source spoke with the dialect, memo policy and code page set through the
+// host's option calls.
+class Source {
+ public:
+  explicit Source(int dialect = 2, int memo_policy = 0, int codepage = 0) : spoke_(NewFromDbase(ZQSpokeDef{})) {
+    spoke_->SetOption("version", std::to_string(dialect).c_str());
+    spoke_->SetOption("ignorememoerr", std::to_string(memo_policy).c_str());
+    if (codepage != 0) spoke_->SetOption("codepage", std::to_string(codepage).c_str());
+  }
+  ~Source() {
+    spoke_->ConnectionClose();
+    DeleteFromDbase(spoke_);
+  }
+  Source(const Source&) = delete;
+  Source& operator=(const Source&) = delete;
+
+  ZQFromDbase* operator->() const { return spoke_; }
+  ZQFromDbase* spoke() const { return spoke_; }
+
+  // SetUserInfo then MakeFields; the result of MakeFields.
+  BATCHERR Open(const std::string& path) {
+    ZQConnTarget target;
+    target.path = path.c_str();
+    if (BATCHERR rc = spoke_->SetUserInfo(target); rc != 0) return rc;
+    return spoke_->MakeFields();
+  }
+
+  ZQRecord& Layout() const { return *spoke_->GetLayout(0); }
+  int FieldCount() const { return Layout().FieldCount(); }
+  ZQField* Field(int i) const { return Layout().GetFieldbyPos(i); }
+  std::string Name(int i) const { return Field(i)->Name(); }
+  // The field's value in its text form.
+  std::string Text(int i) const {
+    const ZQString& s = Field(i)->StringRef();
+    return std::string(s.c_str(), size_t(s.length()));
+  }
+  // Field 0's text of every record from 0 until GetRecord stops; `rc` gets
+  // the result that stopped it.
+  std::vector<std::string> FirstColumn(BATCHERR* rc = nullptr, int limit = 1000000) {
+    std::vector<std::string> out;
+    BATCHERR r = 0;
+    for (int n = 0; n < limit; ++n) {
+      r = spoke_->GetRecord(n);
+      if (r != 0) break;
+      out.push_back(Text(0));
+    }
+    if (rc) *rc = r;
+    return out;
+  }
+
+ private:
+  ZQFromDbase* spoke_;
+};
+
+}  // namespace tests

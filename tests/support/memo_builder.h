@@ -1,0 +1,121 @@
+// Builds memo files byte by byte for tests, and a table beside them, so that
+// expected bytes come from the test, not from the code under test.
+//
+//   auto memo = MemoBytes(Db4Header(3, 0x0101, 512)).At(1, Db4Block("hello"), 512).Build();
+#pragma once
+
+#include <unistd.h>
+
+#include <cstdint>
+#include <cstdlib>
+#include <string>
+#include <sys/stat.h>
+
+#include "host/endian.h"
+#include "tests/support/dbf_builder.h"
+
+namespace tests {
+
+inline Bytes Text(const std::string& s) { return Bytes(s.begin(), s.end()); }
+
+// Headers of the four layouts, 512 bytes each.
+inline Bytes Db3Header(uint32_t next) {
+  Bytes h(512, 0);
+  PutLe32(&h[0], next);
+  return h;
+}
+inline Bytes Db4Header(uint32_t next, uint16_t version, uint16_t block_size, const std::string& name = "T") {
+  Bytes h(512, 0);
+  PutLe32(&h[0], next);
+  for (size_t i = 0; i < name.size() && i < 9; ++i) h[8 + i] = uint8_t(name[i]);
+  PutLe16(&h[18], version);
+  PutLe16(&h[20], block_size);
+  return h;
+}
+inline Bytes FptHeader(uint32_t next, uint16_t block_size) {
+  Bytes h(512, 0);
+  PutBe32(&h[0], next);
+  PutBe16(&h[6], block_size);
+  return h;
+}
+inline Bytes SmtHeader(uint32_t next, uint32_t block_size) {
+  Bytes h(512, 0);
+  PutLe32(&h[0], next);
+  PutLe32(&h[4], block_size);
+  return h;
+}
+
+// Memo blocks as each kind stores a text.
+inline Bytes Db3Block(const std::string& text) {
+  Bytes b = Text(text);
+  b.push_back(0x1A);
+  return b;
+}
+inline Bytes Db4Block(const std::string& text, uint16_t offset = 8) {
+  Bytes b(8, 0);
+  b[0] = b[1] = 0xFF;
+  PutLe16(&b[2], offset);
+  PutLe32(&b[4], uint32_t(text.size() + offset));
+  b.insert(b.end(), text.begin(), text.end());
+  return b;
+}
+inline Bytes FptBlock(const std::string& text, uint32_t type = 1) {
+  Bytes b(8, 0);
+  PutBe32(&b[0], type);
+  PutBe32(&b[4], uint32_t(text.size()));
+  b.insert(b.end(), text.begin(), text.end());
+  return b;
+}
+// A free run of the dBASE IV chain.
+inline Bytes FreeEntry(uint32_t next, uint32_t count) {
+  Bytes b(8, 0);
+  PutLe32(&b[0], next);
+  PutLe32(&b[4], count);
+  return b;
+}
+
+// A memo file: a header and blocks placed by number, zero-padded to whole
+// blocks.
+class MemoBytes {
+ public:
+  explicit MemoBytes(Bytes header) : bytes_(std::move(header)) {}
+  MemoBytes& At(uint32_t block, const Bytes& b, uint32_t block_size) {
+    size_t off = size_t(block) * block_size;
+    size_t end = off + b.size();
+    size_t padded = (end + block_size - 1) / block_size * block_size;
+    if (bytes_.size() < padded) bytes_.resize(padded, 0);
+    std::copy(b.begin(), b.end(), bytes_.begin() + long(off));
+    return *this;
+  }
+  Bytes Build() const { return bytes_; }
+
+ private:
+  Bytes bytes_;
+};
+
+// A path in a directory of this process alone, removed when it ends: test
+// programs run side by side.
+inline std::string MemoScratch(const std::string& name) {
+  static const std::string dir = [] {
+    std::string d = "/tmp/zqdbse-memo-" + std::to_string(getpid());
+    mkdir(d.c_str(), 0700);
+    static std::string to_remove = d;
+    atexit([] {
+      std::string rm = "rm -rf '" + to_remove + "'";
+      if (system(rm.c_str()) != 0) {
+      }
+    });
+    return d;
+  }();
+  return dir + "/" + name;
+}
+
+inline std::string WriteAt(const std::string& path, const Bytes& bytes) {
+  FILE* f = fopen(path.c_str(), "wb");
+  if (f == nullptr) return "";
+  if (!bytes.empty()) fwrite(bytes.data(), 1, bytes.size(), f);
+  fclose(f);
+  return path;
+}
+
+}  // namespace tests

@@ -1,0 +1,208 @@
+// Opening memo files and reading memos of every kind, good and damaged.
+#include <gtest/gtest.h>
+
+#include <string>
+
+#include "table/dbf.h"
+#include "table/memo.h"
+#include "tests/support/memo_builder.h"
+
+namespace {
+
+using tests::Bytes;
+using tests::MemoBytes;
+using tests::Text;
+
+// A table with one memo field and its memo file, opened writable.
+struct MemoTable {
+  MemoTable(const std::string& stem, uint8_t version, int dialect, const std::string& ext, const Bytes& memo) {
+    path = tests::MemoScratch(stem + ".dbf");
+    tests::WriteAt(path, tests::DbfBuilder(version).Field("NOTES", 'M', 10).Build());
+    memo_path = tests::MemoScratch(stem + "." + ext);
+    if (!ext.empty()) tests::WriteAt(memo_path, memo);
+    int v = dialect;
+    db = dbopen(nullptr, path.c_str(), fields, &v, true);
+  }
+  ~MemoTable() {
+    if (db != nullptr) dbclose(fields, db);
+  }
+  std::string Get(uint32_t block, uint32_t length = 0, bool* ok = nullptr) {
+    ZQString text;
+    db->memostat = 1;
+    bool r = getmemo(db, block, length, text);
+    if (ok != nullptr) *ok = r;
+    return std::string(text.c_str(), size_t(text.length()));
+  }
+
+  std::string path, memo_path;
+  ZQDBFIELD* fields[kMaxFields] = {};
+  ZQDBFILE* db = nullptr;
+};
+
+TEST(MemoOpen, ChoosesKindAndBlockSizeFromTheFiles) {
+  MemoTable db3("open3", 0x83, 1, "dbt", tests::Db3Header(1));
+  ASSERT_NE(db3.db, nullptr);
+  EXPECT_EQ(db3.db->memofailed, 0);
+  EXPECT_EQ(db3.db->memokind, MEMO_DB3);
+  EXPECT_EQ(db3.db->memoblksize, 512);
+
+  MemoTable db4("open4", 0x8B, 2, "dbt", tests::Db4Header(1, 0x0101, 1024));
+  EXPECT_EQ(db4.db->memokind, MEMO_DB4);
+  EXPECT_EQ(db4.db->memoblksize, 1024);
+  EXPECT_EQ(db4.db->memooff, 0);
+
+  MemoTable free4("openfree", 0x8B, 2, "dbt", tests::Db4Header(1, 0x0102, 512));
+  EXPECT_EQ(free4.db->memokind, MEMO_DB4FREE);
+
+  // The same byte under Enable OA means the dBASE III form.
+  MemoTable oa("openoa", 0x8B, 7, "dbt", tests::Db3Header(1));
+  EXPECT_EQ(oa.db->memokind, MEMO_DB3);
+  EXPECT_EQ(oa.db->memofailed, 0);
+
+  MemoTable fpt("openfpt", 0xF5, 6, "fpt", tests::FptHeader(8, 64));
+  EXPECT_EQ(fpt.db->memokind, MEMO_FPT);
+  EXPECT_EQ(fpt.db->memoblksize, 64);
+
+  Bytes smt_header = tests::SmtHeader(8, 0x00010040);  // only the low 16 bits count
+  MemoTable smt("opensmt", 0xE5, 8, "smt", smt_header);
+  EXPECT_EQ(smt.db->memokind, MEMO_SMT);
+  EXPECT_EQ(smt.db->memoblksize, 64);
+
+  // The extension in upper case is tried when the lower-case one is missing.
+  MemoTable upper("openup", 0x83, 1, "DBT", tests::Db3Header(1));
+  EXPECT_EQ(upper.db->memofailed, 0);
+}
+
+TEST(MemoOpen, RefusesBadHeadersButKeepsTheTable) {
+  Bytes off = tests::Db4Header(1, 0x0101, 512);
+  off[22] = 1;  // memo handling switched off
+  MemoTable memooff("hdroff", 0x8B, 2, "dbt", off);
+  EXPECT_EQ(memooff.db->memofailed, 0);
+  EXPECT_EQ(memooff.db->memooff, 1);
+
+  struct Case {
+    const char* stem;
+    uint8_t version;
+    int dialect;
+    const char* ext;
+    Bytes memo;
+  } cases[] = {
+      {"badver", 0x8B, 2, "dbt", tests::Db4Header(1, 0x0201, 512)},  // unknown version word
+      {"zero4", 0x8B, 2, "dbt", tests::Db4Header(1, 0x0101, 0)},     // block size 0
+      {"zerofpt", 0xF5, 6, "fpt", tests::FptHeader(1, 0)},
+      {"zerosmt", 0xE5, 8, "smt", tests::SmtHeader(8, 0x00010000)},  // low 16 bits 0
+      {"cut4", 0x8B, 2, "dbt", Bytes(19, 0)},                        // ends in the version word
+      {"cutfpt", 0xF5, 6, "fpt", Bytes(7, 0)},
+      {"missing", 0x83, 1, "", Bytes()},
+  };
+  for (const Case& c : cases) {
+    MemoTable t(c.stem, c.version, c.dialect, c.ext, c.memo);
+    ASSERT_NE(t.db, nullptr) << c.stem;
+    EXPECT_EQ(t.db->memofailed, 1) << c.stem;
+    EXPECT_FALSE(t.db->memofile.isOpen()) << c.stem;
+    bool ok = true;
+    // No memo file: the block number comes back as text, and false.
+    EXPECT_EQ(t.Get(42, 5, &ok), "        42") << c.stem;
+    EXPECT_FALSE(ok);
+  }
+}
+
+TEST(MemoRead, Db3TextEndsAtTheMarkTheEndOfFileOrThe32000Cap) {
+  std::string big(40000, 'x');
+  Bytes memo = MemoBytes(tests::Db3Header(200))
+                   .At(1, tests::Db3Block("hello\x1A" "after"), 512)
+                   .At(2, tests::Db3Block(big), 512)
+                   .At(100, Text("runs to the end"), 512)
+                   .Build();
+  memo.resize(100 * 512 + 15);  // block 100 has no 0x1A: the file ends inside it
+  MemoTable t("read3", 0x83, 1, "dbt", memo);
+  bool ok = false;
+  EXPECT_EQ(t.Get(0, 0, &ok), "");
+  EXPECT_TRUE(ok);
+  EXPECT_EQ(t.Get(1, 0, &ok), "hello");
+  EXPECT_TRUE(ok);
+  EXPECT_EQ(t.Get(2, 0, &ok), std::string(32000, 'x'));
+  EXPECT_TRUE(ok);
+  EXPECT_EQ(t.Get(100, 0, &ok), "runs to the end");
+  EXPECT_TRUE(ok);
+  // A block at or past the end of the file is a damaged pointer.
+  EXPECT_EQ(t.Get(101, 0, &ok), "");
+  EXPECT_FALSE(ok);
+  EXPECT_EQ(t.db->memostat, 1);
+  // A block whose offset 32 bits can't hold never wraps onto another memo.
+  EXPECT_EQ(t.Get(0x00800001, 0, &ok), "");
+  EXPECT_FALSE(ok);
+}
+
+TEST(MemoRead, Db4CountsTheTextByTheLengthWordsAndTrustsNoLength) {
+  std::string big(40000, 'y');
+  Bytes odd = tests::Db4Block("abcde", 16);  // offset word 16: text still at 8
+  Bytes below = tests::Db4Block("zz");
+  PutLe32(&below[4], 3);  // total length below the offset word
+  Bytes huge = tests::Db4Block("tail");
+  PutLe32(&huge[4], 0x7FFFFFF0);  // far more than the file holds
+  Bytes memo = MemoBytes(tests::Db4Header(90, 0x0102, 512))
+                   .At(1, tests::Db4Block("hello"), 512)
+                   .At(2, odd, 512)
+                   .At(3, below, 512)
+                   .At(4, tests::Db4Block(big), 512)
+                   .At(89, huge, 512)
+                   .Build();
+  memo.resize(89 * 512 + 12);  // the file ends inside the last memo
+  MemoTable t("read4", 0x8B, 2, "dbt", memo);
+  bool ok = false;
+  EXPECT_EQ(t.Get(1, 0, &ok), "hello");
+  EXPECT_TRUE(ok);
+  EXPECT_EQ(t.Get(2, 0, &ok), "abcde");
+  EXPECT_TRUE(ok);
+  EXPECT_EQ(t.Get(4, 0, &ok), big);  // no 32,000 cap outside the dBASE III form
+  EXPECT_TRUE(ok);
+  EXPECT_EQ(t.Get(3, 0, &ok), "");
+  EXPECT_FALSE(ok);
+  // The read ends at the end of the file: the bytes there, and false.
+  EXPECT_EQ(t.Get(89, 0, &ok), "tail");
+  EXPECT_FALSE(ok);
+  EXPECT_EQ(t.db->memostat, 1);
+}
+
+TEST(MemoRead, FptReadsTextBlocksOnlyAndTrustsNoLength) {
+  Bytes huge = tests::FptBlock("abc");
+  PutBe32(&huge[4], 0xFFFFFFFF);
+  Bytes memo = MemoBytes(tests::FptHeader(12, 64))
+                   .At(8, tests::FptBlock("fox text"), 64)
+                   .At(9, tests::FptBlock("picture", 0), 64)
+                   .At(10, huge, 64)
+                   .Build();
+  MemoTable t("readfpt", 0xF5, 6, "fpt", memo);
+  bool ok = false;
+  EXPECT_EQ(t.Get(8, 0, &ok), "fox text");
+  EXPECT_TRUE(ok);
+  EXPECT_EQ(t.Get(9, 0, &ok), "");
+  EXPECT_FALSE(ok);
+  EXPECT_EQ(t.db->memostat, 0);  // not text: the caller shows a blank field
+  t.Get(10, 0, &ok);
+  EXPECT_FALSE(ok);
+  EXPECT_EQ(t.db->memostat, 1);  // damage, not "no text"
+}
+
+TEST(MemoRead, SmtTakesTheLengthFromThePointer) {
+  Bytes memo = MemoBytes(tests::SmtHeader(10, 64)).At(8, Text("clipper memo text"), 64).Build();
+  MemoTable t("readsmt", 0xE5, 8, "smt", memo);
+  bool ok = false;
+  EXPECT_EQ(t.Get(8, 7, &ok), "clipper");
+  EXPECT_TRUE(ok);
+  EXPECT_EQ(t.Get(12345, 0, &ok), "");  // length 0: no memo, no file access
+  EXPECT_TRUE(ok);
+  EXPECT_EQ(t.Get(8, 1000, &ok).size(), 64u);  // a length past the end reads what is there
+  EXPECT_FALSE(ok);
+}
+
+TEST(MemoBlockNumber, TextFormOfThePointer) {
+  EXPECT_EQ(ZQMemoBlockNumber::StringtoNumber(ZQString("          ")), 0u);
+  EXPECT_EQ(ZQMemoBlockNumber::StringtoNumber(ZQString("0000000000")), 0u);
+  EXPECT_EQ(ZQMemoBlockNumber::StringtoNumber(ZQString("0000000042")), 42u);
+  char buf[11];
+  EXPECT_STREQ(ZQMemoBlockNumber::NumbertoBuf(buf, 7), "0000000007");
+}
+
+}  // namespace

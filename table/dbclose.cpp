@@ -19,8 +19,10 @@ int dbclose(ZQDBFIELD** fields, ZQDBFILE* db) {
     }
   }
   ZQFileProxy& f = db->datafile;
+  // An error state left by a read (dbget running off the end of the file) is
+  // no failure of the close: only the stamp and the flush below count.
+  f.clearErrors();
   if (db->changed && f.isOpen()) {
-    f.clearErrors();
     int64_t end = int64_t{db->hdrlen} + int64_t{TableCount(db)} * db->reclen;
     f.seek(end, 0);
     f.putch(kEndMark);

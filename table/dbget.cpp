@@ -14,7 +14,9 @@ int32_t dbget(ZQDBFILE* db, int32_t recno, char* buf, int* live) {
   int flag = f.getch();
   int32_t want = db->reclen > 0 ? int32_t(db->reclen) - 1 : 0;
   int32_t got = flag < 0 ? 0 : f.read(buf, want);
-  *live = flag == kLiveFlag ? 1 : 0;
+  // A flag with no record bytes behind it (the file ends right after it) is
+  // no record, whatever the flag says: it reads as a dead one.
+  *live = flag == kLiveFlag && (got > 0 || want == 0) ? 1 : 0;
   if (flag >= 0 && got == want && offset + db->reclen <= INT32_MAX) {
     db->filepos = int32_t(offset + db->reclen);
     return 0;

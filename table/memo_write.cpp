@@ -87,18 +87,20 @@ int64_t Offset(const ZQDBFILE* file, uint32_t block) { return int64_t{block} * f
 
 // Walks the free chain from `head` to its last entry, the end of the used
 // space. Sets *previous (0 for none) and gives the block for a memo of
-// `extent` blocks, or sets *chained false when the chain can't be trusted:
+// `extent` blocks. A run ended by 0xFFFF that is longer than the memo leaves
+// *split blocks behind it; one used up whole sets *ended. Sets *chained false when the chain can't be trusted:
 // a link that doesn't go up, points past the end of the file or at the
 // header, or an entry ended by 0xFFFF inside the file whose run is too short.
 // The memo then goes to the end of the file and the chain stays untouched.
 // The walk ends because every link must rise and stay within the file.
 uint32_t WalkFreeChain(ZQDBFILE* file, uint32_t head, uint64_t extent, uint32_t* previous, bool* chained,
-                       uint32_t* split) {
+                       uint32_t* split, bool* ended) {
   ZQFileProxy& f = file->memofile;
   uint32_t end = memoendblock(file);
   uint32_t block = head;
   *previous = 0;
   *split = 0;
+  *ended = false;
   while (true) {
     if (block == end) return block;  // the usual end: no word behind the file
     if (block > end || !WritableRun(file, block, 1)) break;
@@ -112,6 +114,7 @@ uint32_t WalkFreeChain(ZQDBFILE* file, uint32_t head, uint64_t extent, uint32_t*
       // the memo only if it holds it; what is left of the run stays free.
       if (count < extent) break;
       if (count > extent) *split = count - uint32_t(extent);
+      else *ended = true;  // the run is used up: the chain ends before it
       return block;
     }
     if (next <= block) break;
@@ -174,9 +177,9 @@ uint32_t addmemo(ZQDBFILE* file, uint32_t block, const ZQString& text) {
   if (!ReadHeadWord(file, &head)) return 0;
   uint64_t extent = ExtentWritten(file, text.length());
   uint32_t previous = 0, split = 0;
-  bool chained = true;
+  bool chained = true, ended = false;
   if (file->memokind == MEMO_DB4FREE) {
-    block = WalkFreeChain(file, head, extent, &previous, &chained, &split);
+    block = WalkFreeChain(file, head, extent, &previous, &chained, &split, &ended);
   } else {
     // A next free block of 0 (the header) or past the end of the file is
     // damage: the memo goes to the end of the file and the header follows.
@@ -193,7 +196,7 @@ uint32_t addmemo(ZQDBFILE* file, uint32_t block, const ZQString& text) {
       putmlong(f, kFreeChainEnd);
       putmlong(f, split);
     }
-    WriteWordAt(file, previous != 0 ? Offset(file, previous) : kMemoNextFree, after);
+    WriteWordAt(file, previous != 0 ? Offset(file, previous) : kMemoNextFree, ended ? kFreeChainEnd : after);
   }
   return file->memofile.hasError() ? 0 : block;
 }
@@ -239,17 +242,19 @@ int deloldm(ZQDBFILE* file, uint32_t block, int blocks) {
   uint32_t head;
   if (!ReadHeadWord(file, &head)) return -1;
   if (head == block) return 0;  // already the first free run
+  // A chain that doesn't rise or leaves the file can't take the run safely;
+  // the blocks are then lost, as in the other kinds.
+  if (head > end && head != kFreeChainEnd) return 0;
   uint32_t previous = 0, next = head;
   if (head < block) {
     previous = head;
     while (true) {
-      // A chain that doesn't rise or leaves the file can't take the run
-      // safely; the blocks are then lost, as in the other kinds.
       if (previous >= end || !WritableRun(file, previous, 1)) return 0;
       if (f.seek(Offset(file, previous), 0) < 0) return -1;
       next = getmlong(f);
       if (f.hasError()) return 0;
       if (next == block) return 0;  // already free
+      if (next > end && next != kFreeChainEnd) return 0;
       if (next >= block || next == kFreeChainEnd) break;
       if (next <= previous) return 0;
       previous = next;

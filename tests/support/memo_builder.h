@@ -12,6 +12,8 @@
 #include <sys/stat.h>
 
 #include "host/endian.h"
+#include "table/dbf.h"
+#include "table/memo.h"
 #include "tests/support/dbf_builder.h"
 
 namespace tests {
@@ -117,5 +119,44 @@ inline std::string WriteAt(const std::string& path, const Bytes& bytes) {
   fclose(f);
   return path;
 }
+
+// A table with one memo field and its memo file, opened writable.
+struct MemoTable {
+  MemoTable(const std::string& stem, uint8_t version, int dialect, const std::string& ext, const Bytes& memo) {
+    path = MemoScratch(stem + ".dbf");
+    WriteAt(path, DbfBuilder(version).Field("NOTES", 'M', 10).Build());
+    memo_path = MemoScratch(stem + "." + ext);
+    if (!ext.empty()) WriteAt(memo_path, memo);
+    int v = dialect;
+    db = dbopen(nullptr, path.c_str(), fields, &v, true);
+  }
+  ~MemoTable() { Close(); }
+  MemoTable(const MemoTable&) = delete;
+  MemoTable& operator=(const MemoTable&) = delete;
+
+  void Close() {
+    if (db != nullptr) dbclose(fields, db);
+    db = nullptr;
+  }
+  std::string Get(uint32_t block, uint32_t length = 0, bool* ok = nullptr) {
+    ZQString text;
+    db->memostat = 1;
+    bool r = getmemo(db, block, length, text);
+    if (ok != nullptr) *ok = r;
+    return std::string(text.c_str(), size_t(text.length()));
+  }
+  uint32_t Put(uint32_t old, const std::string& text) {
+    return putmemo(db, old, ZQString(text.data(), int32_t(text.size())));
+  }
+  // The memo file as it stands on disk (buffered bytes written first).
+  Bytes MemoFile() {
+    db->memofile.flush();
+    return ReadFile(memo_path);
+  }
+
+  std::string path, memo_path;
+  ZQDBFIELD* fields[kMaxFields] = {};
+  ZQDBFILE* db = nullptr;
+};
 
 }  // namespace tests

@@ -13,31 +13,7 @@ using tests::Bytes;
 using tests::MemoBytes;
 using tests::Text;
 
-// A table with one memo field and its memo file, opened writable.
-struct MemoTable {
-  MemoTable(const std::string& stem, uint8_t version, int dialect, const std::string& ext, const Bytes& memo) {
-    path = tests::MemoScratch(stem + ".dbf");
-    tests::WriteAt(path, tests::DbfBuilder(version).Field("NOTES", 'M', 10).Build());
-    memo_path = tests::MemoScratch(stem + "." + ext);
-    if (!ext.empty()) tests::WriteAt(memo_path, memo);
-    int v = dialect;
-    db = dbopen(nullptr, path.c_str(), fields, &v, true);
-  }
-  ~MemoTable() {
-    if (db != nullptr) dbclose(fields, db);
-  }
-  std::string Get(uint32_t block, uint32_t length = 0, bool* ok = nullptr) {
-    ZQString text;
-    db->memostat = 1;
-    bool r = getmemo(db, block, length, text);
-    if (ok != nullptr) *ok = r;
-    return std::string(text.c_str(), size_t(text.length()));
-  }
-
-  std::string path, memo_path;
-  ZQDBFIELD* fields[kMaxFields] = {};
-  ZQDBFILE* db = nullptr;
-};
+using tests::MemoTable;
 
 TEST(MemoOpen, ChoosesKindAndBlockSizeFromTheFiles) {
   MemoTable db3("open3", 0x83, 1, "dbt", tests::Db3Header(1));

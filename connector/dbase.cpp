@@ -202,9 +202,11 @@ BATCHERR ZQDbase::GetRecord(ZQRecord& record, int32_t n, int64_t* position, bool
 
 void ZQDbase::CloseFile(const ZQConnTarget* target) {
   if (Table == nullptr) return;
+  bool hasmemo = Table->hasmemo != 0;
+  char memokind = char(Table->memokind);
   dbclose(FieldList, Table);
   Table = nullptr;
-  (void)target;  // removing a table's files comes with the writing side
+  if (target != nullptr) dbdelete(target->path.c_str(), hasmemo, memokind);
 }
 
 bool ZQDbase::IsMemoType(int type) const {

@@ -9,6 +9,7 @@
 #include <string>
 #include <vector>
 
+#include "engine/convert.h"
 #include "engine/dbf_source.h"
 #include "engine/dbfpeek.h"
 #include "engine/outbuf.h"
@@ -27,12 +28,18 @@ const char kUsage[] =
     "commands:\n"
     "  info TABLE               dialect, version byte, record counts and fields\n"
     "  cat TABLE                the live records (--format csv|jsonl|table)\n"
+    "  convert SRC DST          records from a table or CSV file to a table, CSV or JSON-lines file\n"
     "\n"
     "options (before or after the file names):\n"
     "  --dialect D              0-10 or a name: \"dBASE IV\", foxpro, clipper, ...\n"
     "  --codepage N             the table's code page (437, 850, 1252, ...); 0 = bytes as they are\n"
     "  --memo never|errors|always   when to ignore the memo file (default never)\n"
     "  --format csv|jsonl|table output of cat (default csv)\n"
+    "  --to D                   convert: the target's dialect (default: the source's; dBASE IV for CSV)\n"
+    "  --mode replace|append|update   convert: make the target anew, add to it, or update it by --key\n"
+    "  --key FIELD[,FIELD]      convert --mode update: the fields that identify a record\n"
+    "  --schema \"NAME C(30), BORN D, AMOUNT N(12,2), NOTE M\"   convert: column types of a CSV source\n"
+    "  --no-progress            convert: no progress line on a terminal\n"
     "  --help                   this text\n";
 
 struct Args {
@@ -40,6 +47,7 @@ struct Args {
   std::vector<std::string> files;
   SourceOptions source;
   OutputFormat format = OutputFormat::kCsv;
+  ConvertOptions convert;
 };
 
 int Usage(const std::string& message) {
@@ -97,6 +105,31 @@ int ParseArgs(int argc, char** argv, Args* args) {
       std::string v;
       if (!take(&v)) return Usage("--format needs a value");
       if (!ParseFormat(v, &args->format)) return Usage("--format takes csv, jsonl or table, not " + v);
+    } else if (a == "--to") {
+      if (!take(&args->convert.to)) return Usage("--to needs a value");
+    } else if (a == "--mode") {
+      std::string v;
+      if (!take(&v)) return Usage("--mode needs a value");
+      if (v == "replace") args->convert.mode = 0;
+      else if (v == "append") args->convert.mode = 1;
+      else if (v == "update") args->convert.mode = 2;
+      else return Usage("--mode takes replace, append or update, not " + v);
+    } else if (a == "--key") {
+      std::string v;
+      if (!take(&v)) return Usage("--key needs a value");
+      size_t start = 0;
+      while (start <= v.size()) {
+        size_t comma = v.find(',', start);
+        std::string part = v.substr(start, comma == std::string::npos ? std::string::npos : comma - start);
+        if (part.empty()) return Usage("--key has an empty field name");
+        args->convert.key.push_back(part);
+        if (comma == std::string::npos) break;
+        start = comma + 1;
+      }
+    } else if (a == "--schema") {
+      if (!take(&args->convert.schema)) return Usage("--schema needs a value");
+    } else if (a == "--no-progress") {
+      args->convert.progress = false;
     } else if (a.rfind("--", 0) == 0 && a.size() > 2) {
       return Usage("unknown option " + a);
     } else if (args->command.empty()) {
@@ -183,6 +216,23 @@ int CmdCat(const Args& args) {
   return 0;
 }
 
+int CmdConvert(Args& args) {
+  if (args.files.size() != 2) return Usage("convert takes a source and a target");
+  if (args.convert.mode != 2 && !args.convert.key.empty()) return Usage("--key goes with --mode update");
+  if (!args.convert.to.empty()) {
+    // Checked here so that a wrong name is a usage error, before any file is touched.
+    SourcePtr probe(NewFromDbase(ZQSpokeDef{}));
+    if (!probe || !ApplyDialect(probe.get(), args.convert.to)) return Usage("unknown dialect: " + args.convert.to);
+  }
+  if (!args.source.dialect.empty()) {
+    SourcePtr probe(NewFromDbase(ZQSpokeDef{}));
+    if (!probe || !ApplyDialect(probe.get(), args.source.dialect))
+      return Usage("unknown dialect: " + args.source.dialect);
+  }
+  args.convert.source = args.source;
+  return RunConvert(args.files[0], args.files[1], args.convert);
+}
+
 void QuietSink(void*, int level, BATCHERR, const char* message) {
   // Failures come back as results and are reported once by the command;
   // layout differences and other warnings are shown as they happen.
@@ -197,5 +247,6 @@ int ZqdbMain(int argc, char** argv) {
   if (int rc = ParseArgs(argc, argv, &args)) return rc;
   if (args.command == "info") return CmdInfo(args);
   if (args.command == "cat") return CmdCat(args);
+  if (args.command == "convert") return CmdConvert(args);
   return Usage("unknown command " + args.command);
 }

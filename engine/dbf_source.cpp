@@ -55,13 +55,31 @@ bool ApplyDialect(ZQSpoke* spoke, const std::string& value) {
   return true;
 }
 
+int GuessDialect(const std::string& path) {
+  FILE* f = fopen(path.c_str(), "rb");
+  int v = f ? fgetc(f) : EOF;
+  if (f) fclose(f);
+  switch (v) {
+    case 0x02: return 0;  // dBASE II (Enable's narrow tables read the same)
+    case 0xFE: return 3;  // Enable with more than 32 fields
+    case 0x30: return 10; // Visual FoxPro
+    default: return 2;    // dBASE IV reads III, III+, IV and, by their bytes, FoxPro and Clipper
+  }
+}
+
 BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePtr* out, std::string* error) {
   SourcePtr spoke(NewFromDbase(ZQSpokeDef{}));
   if (!spoke) {
     *error = "out of memory";
     return ZQ_NO_MEMORY;
   }
-  if (!opts.dialect.empty() && !ApplyDialect(spoke.get(), opts.dialect)) {
+  if (opts.dialect.empty()) {
+    // No dialect named: take the one the version byte points to, so that
+    // any table reads without the user knowing its dialect.
+    char guess[4];
+    snprintf(guess, sizeof guess, "%d", GuessDialect(path));
+    spoke->SetOption("version", guess);
+  } else if (!ApplyDialect(spoke.get(), opts.dialect)) {
     *error = "unknown dialect: " + opts.dialect;
     return ZQ_BAD_OPTIONS;
   }

@@ -23,6 +23,10 @@ using SourcePtr = std::unique_ptr<ZQFromDbase, SpokeDeleter>;
 // it. False when the value names no dialect.
 bool ApplyDialect(ZQSpoke* spoke, const std::string& value);
 
+// The dialect that a table's version byte points to, for tables opened
+// without --dialect.
+int GuessDialect(const std::string& path);
+
 // Opens `path`; on failure `error` holds the spoke's message and the result
 // is the spoke's code (non-zero).
 BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePtr* out, std::string* error);

@@ -74,6 +74,15 @@ void ZQField::AssignDateText(const char* p, int32_t n) {
       return;
     }
   }
+  if (n == 10 && p[4] == '-' && p[7] == '-') {  // ISO 8601, as text files write dates
+    char digits[8] = {p[0], p[1], p[2], p[3], p[5], p[6], p[8], p[9]};
+    bool ok = true;
+    for (char c : digits) ok = ok && c >= '0' && c <= '9';
+    if (ok) {
+      AssignDateText(digits, 8);
+      if (held_ == Held::kDate) return;
+    }
+  }
   bool empty = true;
   for (int32_t i = 0; i < n; ++i)
     if (p[i] != ' ' && p[i] != '0' && p[i] != '\0') empty = false;
@@ -94,6 +103,11 @@ void ZQField::AssignBoolText(const char* p, int32_t n) {
 }
 
 void ZQField::operator=(int32_t value) {
+  long_ = value;
+  held_ = Held::kLong;
+}
+
+void ZQField::SetLong(int64_t value) {
   long_ = value;
   held_ = Held::kLong;
 }

@@ -38,6 +38,7 @@ class ZQField {
   void operator=(const ZQDateTime& value);
   void SetDate(int32_t year, int32_t month, int32_t day);
   void SetBool(bool value);
+  void SetLong(int64_t value);
   // Blanks the value; the text buffer keeps its room for the next value.
   void Blank() { held_ = Held::kBlank; }
 

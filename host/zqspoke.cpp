@@ -245,3 +245,28 @@ BATCHERR ZQImport::SetUserInfo(const ZQConnTarget& target) {
 
 ZQExport::ZQExport(const ZQSpokeDef& def, const char** typedefs, bool flag) : ZQSpoke(def, typedefs, flag) {}
 ZQExport::~ZQExport() = default;
+
+BATCHERR ZQExport::SetUserInfo(const ZQConnTarget& target) {
+  target_.path = target.path;
+  return 0;
+}
+BATCHERR ZQExport::MakeFields(ZQRecord&, const ZQConnTarget&) { return ZQ_NOT_SUPPORTED; }
+void ZQExport::FormatSpokeField(ZQField*, const ZQField*) const {}
+BATCHERR ZQExport::DeleteRecord(int, const wchar*) { return ZQ_NOT_SUPPORTED; }
+BATCHERR ZQExport::GenerateDetailRecord(int) { return ZQ_NOT_SUPPORTED; }
+BATCHERR ZQExport::_CloseOutput(bool) { return 0; }
+BATCHERR ZQExport::_OpenOutput(const ZQConnTarget& target) {
+  target_.path = target.path;
+  return 0;
+}
+BATCHERR ZQExport::GetRecord(ZQRecord&, int64_t*) { return ZQ_NOT_SUPPORTED; }
+BATCHERR ZQExport::GetandDeleteRecord(ZQRecord&) { return ZQ_NOT_SUPPORTED; }
+BATCHERR ZQExport::SetFilePosition(int64_t) { return ZQ_NOT_SUPPORTED; }
+void ZQExport::FieldNameCharSet(ZQString& first, ZQString& second) {
+  first = "";
+  second = "";
+}
+BATCHERR ZQExport::ValidateLocalRecord(const ZQRecord&, int& field) {
+  field = -1;
+  return 0;
+}

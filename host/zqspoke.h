@@ -280,7 +280,26 @@ class ZQExport : public ZQSpoke {
   ZQExport(const ZQSpokeDef& def, const char** typedefs, bool flag);
   ~ZQExport() override;
 
+  // Virtual operations in the framework's slot order (those this system
+  // uses); the defaults say "not supported".
+  virtual BATCHERR SetUserInfo(const ZQConnTarget& target);
+  virtual int64_t EstimateRecordCount() { return 0; }
   virtual int64_t DeletedRecordCount() const { return deleted_count_; }
   virtual int64_t UpdatedRecordCount() const { return updated_count_; }
   virtual int64_t InsertedRecordCount() const { return inserted_count_; }
+  virtual const ZQConnTargetInfo* GetTargetInfo() const { return nullptr; }
+  virtual BATCHERR MakeFields(ZQRecord& record, const ZQConnTarget& target);
+  virtual void FormatSpokeField(ZQField* field, const ZQField* other) const;
+  virtual int FieldNameMaxLength() { return 64; }
+  virtual BATCHERR DeleteRecord() { return ZQ_NOT_SUPPORTED; }
+  virtual BATCHERR DeleteRecord(int layout, const wchar* condition);
+  virtual BATCHERR GenerateDetailRecord(int layout);
+  virtual BATCHERR _CloseOutput(bool keep);
+  virtual BATCHERR _OpenOutput(const ZQConnTarget& target);
+  virtual BATCHERR GetRecord(ZQRecord& record, int64_t* position);
+  virtual BATCHERR GetandDeleteRecord(ZQRecord& record);
+  virtual BATCHERR Unwind() { return ZQ_NOT_SUPPORTED; }
+  virtual BATCHERR SetFilePosition(int64_t position);
+  virtual void FieldNameCharSet(ZQString& first, ZQString& second);
+  virtual BATCHERR ValidateLocalRecord(const ZQRecord& record, int& field);
 };

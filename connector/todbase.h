@@ -1,0 +1,75 @@
+// The target spoke: from the engine's records to a table.
+//
+// States: closed -> open (after _OpenOutput: a table open, CurrentRecord set,
+// the target remembered) -> closed (_CloseOutput). Records are written one at
+// a time, memo first, then the table record, then index keys and counters;
+// nothing is collected for close.
+#pragma once
+
+#include "connector/dbase.h"
+#include "host/zqspoke.h"
+
+class ZQToDbase : public ZQExport {
+ public:
+  explicit ZQToDbase(const ZQSpokeDef& def);
+  ~ZQToDbase() override;
+
+  ZQSpokeOptions* NewOptions() const override;
+  void DeleteOptions(ZQSpokeOptions* opts) const override;
+  bool FillOptions(ZQSpokeOptions* opts) const override;
+  BATCHERR SetOptions(const ZQSpokeOptions* opts) override;
+  bool SupportMode(SpokeMode mode) const override { return mode >= 0 && mode <= 2; }
+  bool SupportIndexes() const override { return true; }
+  bool SupportURI() const override { return true; }
+  int MaxFieldCount() override;
+  void LoadOptions(ZQString& text) override;
+  int OptionDefCount() const override;
+  ZQOptionDef** GetOptionDefs() const override;
+  BATCHERR _Rewind() override;
+  ZQSpokeOptions* GetOptions() const override;
+  void SaveOptions(ZQString& text) const override;
+
+  const ZQConnTargetInfo* GetTargetInfo() const override;
+  BATCHERR MakeFields(ZQRecord& record, const ZQConnTarget& target) override;
+  void FormatSpokeField(ZQField* field, const ZQField* other) const override;
+  int FieldNameMaxLength() override { return 10; }
+  BATCHERR DeleteRecord() override;
+  BATCHERR DeleteRecord(int layout, const wchar* condition) override;
+  BATCHERR GenerateDetailRecord(int layout) override;
+  BATCHERR _CloseOutput(bool keep) override;
+  BATCHERR _OpenOutput(const ZQConnTarget& target) override;
+  BATCHERR GetRecord(ZQRecord& record, int64_t* position) override;
+  BATCHERR GetandDeleteRecord(ZQRecord& record) override;
+  BATCHERR Unwind() override;
+  BATCHERR SetFilePosition(int64_t position) override;
+  void FieldNameCharSet(ZQString& first, ZQString& second) override;
+  BATCHERR ValidateLocalRecord(const ZQRecord& record, int& field) override;
+
+  // The number of fields a new table of the current dialect keeps; fields of
+  // a layout behind it don't reach the table.
+  int CreateFieldCap() const;
+  // Read-only view for reports and tests.
+  const ZQDBFILE* TableHandle() const { return dbase.Table; }
+  int32_t Position() const { return CurrentRecord; }
+
+ private:
+  BATCHERR DBCreateFile(const char* path, ZQIndexDef* const* indexes);
+  bool LayoutsMatch();
+  char DTypeToDbase(ZQDType type);
+  BATCHERR FormatDBMemo(char* dest, ZQField* field);
+  BATCHERR FormatClipperMemo(char* dest, ZQField* field);
+  // Reads the old memo at `block` into MemoScratch; false when it can't.
+  bool ReadOldMemo(uint32_t block);
+  // The physical record that a write at CurrentRecord goes to; -1 for none.
+  int32_t PhysicalForWrite();
+  void EncodeNumber(char* dest, int32_t room, ZQField* field);
+
+  mutable ZQDbase dbase{this};
+  class ZQDBIndexBase** IndexObjects = nullptr;
+  ZQString MemoScratch;
+  int32_t CurrentRecord = 0;
+  ZQString FieldScratch;
+};
+
+ZQToDbase* NewToDbase(const ZQSpokeDef& def);
+void DeleteToDbase(ZQToDbase* spoke);

@@ -1,0 +1,416 @@
+#include "engine/convert.h"
+
+#include <unistd.h>
+
+#include <cctype>
+#include <chrono>
+#include <cmath>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+#include <string>
+#include <unordered_map>
+#include <vector>
+
+#include "connector/todbase.h"
+#include "engine/csv_source.h"
+#include "engine/text_target.h"
+#include "engine/text_types.h"
+#include "host/zqutil.h"
+
+namespace {
+
+std::string Lower(std::string s) {
+  for (char& c : s) c = char(tolower(static_cast<unsigned char>(c)));
+  return s;
+}
+
+bool EndsWith(const std::string& s, const std::string& tail) {
+  return s.size() >= tail.size() && Lower(s.substr(s.size() - tail.size())) == tail;
+}
+
+void Warn(const std::string& message) { fprintf(stderr, "zqdb: warning: %s\n", message.c_str()); }
+
+int Fail(const std::string& message) {
+  fprintf(stderr, "zqdb: %s\n", message.c_str());
+  return 1;
+}
+
+// Progress on standard error, only on a terminal and only once a run has
+// taken a second.
+class Progress {
+ public:
+  explicit Progress(bool enabled) : enabled_(enabled && isatty(STDERR_FILENO)) {}
+  void Tick(int64_t n) {
+    if (!enabled_ || (n & 4095) != 0) return;
+    auto now = std::chrono::steady_clock::now();
+    if (now - start_ < std::chrono::seconds(1) || now - last_ < std::chrono::milliseconds(250)) return;
+    last_ = now;
+    shown_ = true;
+    fprintf(stderr, "\r%lld records", static_cast<long long>(n));
+  }
+  ~Progress() {
+    if (shown_) fprintf(stderr, "\r\033[K");
+  }
+
+ private:
+  bool enabled_;
+  bool shown_ = false;
+  std::chrono::steady_clock::time_point start_ = std::chrono::steady_clock::now(), last_ = start_;
+};
+
+// --- The target's layout ---------------------------------------------------
+
+// A name the target accepts: its character sets and its longest name, and
+// different from the names already taken.
+std::string TargetName(ZQExport* target, const std::string& source, const std::vector<std::string>& taken) {
+  ZQString first, second;
+  target->FieldNameCharSet(first, second);
+  size_t max = size_t(target->FieldNameMaxLength());
+  std::string name = source;
+  if (first.length() > 0) {
+    std::string all = std::string(first.c_str()) + second.c_str();
+    for (char& c : name) {
+      c = char(toupper(static_cast<unsigned char>(c)));
+      if (all.find(c) == std::string::npos) c = '_';
+    }
+    if (name.empty() || strchr(first.c_str(), name[0]) == nullptr) name = "_" + name;
+  }
+  if (name.size() > max) name.resize(max);
+  auto used = [&](const std::string& n) {
+    for (const std::string& t : taken)
+      if (Lower(t) == Lower(n)) return true;
+    return false;
+  };
+  for (int k = 2; used(name) && k < 100000; ++k) {
+    std::string suffix = "_" + std::to_string(k);
+    std::string base = name.substr(0, max > suffix.size() ? max - suffix.size() : 0);
+    name = base + suffix;
+  }
+  return name;
+}
+
+const ZQDType* ValidType(ZQExport* target, char letter, FIELDTYPE family) {
+  const ZQDType* const* valid = target->GetValidTypes();
+  for (int i = 0; valid != nullptr && valid[i] != nullptr; ++i)
+    if (valid[i]->Usage() == letter && (family == FT_TEXT || valid[i]->Family() == family)) return valid[i];
+  return nullptr;
+}
+
+struct Planned {
+  ZQDType type;
+  std::string change;  // what the engine changed, for the warning; "" = nothing
+};
+
+// The target type of a source field: the same letter where the target has
+// it, else the nearest type that keeps the value.
+bool PlanType(ZQExport* target, const ZQField* src, Planned* out) {
+  const ZQDType& st = src->DataType();
+  char letter = char(st.Usage());
+  int32_t len = src->Length();
+  int16_t dec = st.DecimalPlaces();
+  auto take = [&](char l, FIELDTYPE fam, int32_t length, int16_t decimals, const char* change) {
+    const ZQDType* t = ValidType(target, l, fam);
+    if (t == nullptr) return false;
+    out->type = *t;
+    if (length > 0) out->type.Length(length);
+    out->type.DecimalPlaces(decimals);
+    out->change = change;
+    return true;
+  };
+  constexpr int32_t kText = 254;
+  switch (letter) {
+    case 'C':
+      if (len <= kText) return take('C', FT_TEXT, len, 0, "");
+      return take('M', FT_TEXT, 0, 0, "text longer than 254 bytes stored as a memo") ||
+             take('C', FT_TEXT, kText, 0, "text cut to 254 bytes: this dialect has no memo fields");
+    case 'M':
+      return take('M', FT_TEXT, 0, 0, "") ||
+             take('C', FT_TEXT, kText, 0, "memo folded to text of 254 bytes: this dialect has no memo fields");
+    case 'G':
+      return take('G', FT_BINARY, 0, 0, "") || take('M', FT_TEXT, 0, 0, "binary memo stored as a memo") ||
+             take('C', FT_TEXT, kText, 0, "binary memo folded to text of 254 bytes");
+    case 'B':
+      if (st.Family() == FT_FLOAT)
+        return take('B', FT_FLOAT, 8, 0, "") || take('F', FT_NUMERIC, 20, 6, "double stored as F(20,6)") ||
+               take('N', FT_NUMERIC, 20, 6, "double stored as N(20,6)");
+      return take('B', FT_BINARY, 0, 0, "") || take('G', FT_BINARY, 0, 0, "binary memo stored as G") ||
+             take('M', FT_TEXT, 0, 0, "binary memo stored as a memo") ||
+             take('C', FT_TEXT, kText, 0, "binary memo folded to text of 254 bytes");
+    case 'N': return take('N', FT_NUMERIC, len, dec, "");
+    case 'F': return take('F', FT_NUMERIC, len, dec, "") || take('N', FT_NUMERIC, len, dec, "float stored as N");
+    case 'D': return take('D', FT_DATE, 0, 0, "");
+    case 'L': return take('L', FT_BOOLEAN, 0, 0, "");
+    case 'I': return take('I', FT_INTEGER, 4, 0, "") || take('N', FT_NUMERIC, 11, 0, "integer stored as N(11)");
+    case 'Y':
+      return take('Y', FT_CURRENCY, 8, 4, "") || take('N', FT_NUMERIC, 20, 4, "currency stored as N(20,4)");
+    case 'T':
+      return take('T', FT_DATETIME, 8, 0, "") ||
+             take('C', FT_TEXT, 19, 0, "date-time stored as text (YYYY-MM-DDTHH:MM:SS)");
+    default:
+      return take('C', FT_TEXT, len > 0 && len <= kText ? len : kText, 0,
+                  len > kText ? "field of an unknown type stored as text of 254 bytes" : "");
+  }
+}
+
+// --- Values ------------------------------------------------------------------
+
+// Per target field: how many values did not fit and were cut.
+struct FieldCheck {
+  char letter;
+  int32_t width;
+  int64_t cut = 0;
+  int64_t blank_logicals = 0;  // a table's logical has no blank: they become F
+};
+
+void CopyValue(ZQField* dst, ZQField* src, FieldCheck* check) {
+  switch (src->held()) {
+    case ZQField::Held::kBlank:
+      dst->Blank();
+      if (check->letter == 'L') ++check->blank_logicals;
+      return;
+    case ZQField::Held::kText: {
+      const ZQString& s = src->StringRef();
+      if ((check->letter == 'C' || check->letter == 'N' || check->letter == 'F') && s.length() > check->width)
+        ++check->cut;
+      dst->AssignText(s.c_str(), s.length());
+      return;
+    }
+    case ZQField::Held::kLong: dst->SetLong(src->LongVal()); return;
+    case ZQField::Held::kDouble: *dst = src->DoubleVal(); return;
+    case ZQField::Held::kDate: {
+      const ZQDate& d = src->DateRef();
+      dst->SetDate(d.Year(), d.Month(), d.Day());
+      return;
+    }
+    case ZQField::Held::kDateTime: *dst = src->DateTimeRef(); return;
+    case ZQField::Held::kBool: dst->SetBool(src->BoolVal()); return;
+  }
+}
+
+// The text that identifies a record by its key fields, in one form for any
+// spoke: numbers by value, dates as yyyymmdd, text without trailing blanks.
+void KeyOf(ZQRecord& record, const std::vector<int>& key, std::string* out) {
+  out->clear();
+  for (int i : key) {
+    ZQField* f = record[i];
+    if (f->IsBlank()) {
+      *out += '\x1f';
+      continue;
+    }
+    switch (f->FieldType()) {
+      case FT_NUMERIC:
+      case FT_INTEGER:
+      case FT_FLOAT:
+      case FT_CURRENCY: {
+        char buf[40];
+        snprintf(buf, sizeof buf, "%.15g", f->DoubleVal());
+        *out += buf;
+        break;
+      }
+      default: {
+        ZQString text;
+        f->RenderText(text, 1);
+        text.StripChars(false, true, ' ');
+        out->append(text.c_str(), size_t(text.length()));
+      }
+    }
+    *out += '\x1f';
+  }
+}
+
+struct ImportDeleter {
+  void operator()(ZQImport* s) const {
+    if (auto* d = dynamic_cast<ZQFromDbase*>(s)) DeleteFromDbase(d);
+    else delete s;
+  }
+};
+struct ExportDeleter {
+  void operator()(ZQExport* s) const {
+    if (auto* d = dynamic_cast<ZQToDbase*>(s)) DeleteToDbase(d);
+    else delete s;
+  }
+};
+
+}  // namespace
+
+int RunConvert(const std::string& src, const std::string& dst, const ConvertOptions& opts) {
+  // Source.
+  std::unique_ptr<ZQImport, ImportDeleter> source;
+  bool csv_source = EndsWith(src, ".csv");
+  if (csv_source) {
+    auto csv = std::unique_ptr<ZQImport, ImportDeleter>(new ZQFromCsv());
+    if (!opts.schema.empty()) {
+      std::vector<SchemaField> schema;
+      std::string error;
+      if (!ParseSchema(opts.schema, &schema, &error)) return Fail(error);
+      static_cast<ZQFromCsv*>(csv.get())->SetSchema(schema);
+    }
+    ZQConnTarget t;
+    t.path = src.c_str();
+    csv->SetUserInfo(t);
+    if (csv->MakeFields() != 0) return Fail(csv->LastErrorMessage());
+    source = std::move(csv);
+  } else {
+    SourcePtr dbf;
+    std::string error;
+    if (OpenSource(src, opts.source, &dbf, &error) != 0) return Fail(error);
+    source.reset(dbf.release());
+  }
+  ZQRecord& in = *source->GetLayout(0);
+
+  // Target.
+  std::unique_ptr<ZQExport, ExportDeleter> target;
+  bool dbf_target = true;
+  if (EndsWith(dst, ".csv")) target.reset(new ZQToText(OutputFormat::kCsv)), dbf_target = false;
+  else if (EndsWith(dst, ".jsonl") || EndsWith(dst, ".json")) target.reset(new ZQToText(OutputFormat::kJsonl)), dbf_target = false;
+  else target.reset(NewToDbase(ZQSpokeDef{}));
+  if (!target) return Fail("out of memory");
+  if (dbf_target) {
+    std::string dialect = opts.to;
+    if (dialect.empty()) {
+      ZQString v;
+      if (!csv_source && source->GetOption("version", v) == 0) dialect = v.c_str();
+      else dialect = "2";
+    }
+    if (!ApplyDialect(target.get(), dialect)) return Fail("unknown dialect: " + dialect);
+    char buf[16];
+    snprintf(buf, sizeof buf, "%d", opts.source.codepage);
+    target->SetOption("codepage", buf);
+    snprintf(buf, sizeof buf, "%d", opts.source.memo_policy);
+    target->SetOption("ignorememoerr", buf);
+  } else if (opts.mode != 0) {
+    return Fail("append and update modes need a table as the target");
+  }
+  auto mode = ZQSpoke::SpokeMode(opts.mode);
+  if (!target->SupportMode(mode)) return Fail("the target does not support this mode");
+  target->SetMode(mode);
+
+  // Layout 0 of the target, from the source's.
+  ZQRecord& out = *target->GetLayout(0);
+  out.ClearFields();
+  int cap = target->MaxFieldCount();
+  if (auto* d = dynamic_cast<ZQToDbase*>(target.get()); d != nullptr && opts.mode == 0)
+    cap = std::min(cap, d->CreateFieldCap());
+  std::vector<std::string> names;
+  std::vector<FieldCheck> checks;
+  std::vector<int> from;  // source field of each target field
+  for (int i = 0; i < in.FieldCount(); ++i) {
+    ZQField* s = in[i];
+    if (int(names.size()) == cap) {
+      Warn(std::string("field ") + s->Name() + " and those behind it are left out: the target keeps " +
+           std::to_string(cap) + " fields");
+      break;
+    }
+    Planned plan;
+    if (!PlanType(target.get(), s, &plan)) {
+      Warn(std::string("field ") + s->Name() + " is left out: the target has no type for it");
+      continue;
+    }
+    std::string name = TargetName(target.get(), s->Name(), names);
+    if (name != s->Name()) Warn(std::string("field ") + s->Name() + " is named " + name + " in the target");
+    if (!plan.change.empty()) Warn(std::string("field ") + s->Name() + ": " + plan.change);
+    ZQField* f = out.NewField(plan.type, name.c_str());
+    if (f == nullptr) return Fail("out of memory");
+    target->FormatSpokeField(f, s);
+    names.push_back(name);
+    checks.push_back(FieldCheck{char(plan.type.Usage()), f->Length()});
+    from.push_back(i);
+  }
+  int bad_field = -1;
+  if (target->ValidateLocalRecord(out, bad_field) != 0)
+    return Fail(std::string("records are too long for the target from field ") +
+                (bad_field >= 0 && bad_field < out.FieldCount() ? out[bad_field]->Name() : "?") + " on");
+
+  std::vector<int> key;
+  for (const std::string& k : opts.key) {
+    int found = -1;
+    for (size_t i = 0; i < from.size(); ++i)
+      if (Lower(in[from[i]]->Name()) == Lower(k) || Lower(names[i]) == Lower(k)) found = int(i);
+    if (found < 0) return Fail("--key names no field: " + k);
+    key.push_back(found);
+  }
+  if (opts.mode == 2 && key.empty()) return Fail("update mode needs --key");
+
+  ZQConnTarget t;
+  t.path = dst.c_str();
+  if (target->_OpenOutput(t) != 0) return Fail(target->LastErrorMessage());
+
+  // Update mode: one pass over the table maps each key to its position.
+  std::unordered_map<std::string, int64_t> positions;
+  int64_t live = 0;
+  std::string k;
+  if (opts.mode == 2) {
+    ZQRecord scan(out);
+    target->_Rewind();
+    int64_t pos = 0;
+    BATCHERR rc;
+    while ((rc = target->GetRecord(scan, &pos)) == 0) {
+      KeyOf(scan, key, &k);
+      positions.emplace(k, pos);
+      ++live;
+    }
+    if (rc != ZQ_END) {
+      std::string message = target->LastErrorMessage();
+      target->_CloseOutput(true);
+      return Fail(message);
+    }
+  }
+
+  Progress progress(opts.progress);
+  BATCHERR rc = 0;
+  int32_t n = 0;
+  int64_t updated = 0, added = 0;
+  auto fill = [&]() {
+    for (size_t i = 0; i < from.size(); ++i) CopyValue(out[int(i)], in[from[i]], &checks[i]);
+  };
+  for (;; ++n) {
+    rc = source->GetRecord(n);
+    if (rc != 0) break;
+    fill();
+    if (opts.mode == 2) {
+      KeyOf(out, key, &k);
+      auto it = positions.find(k);
+      if (it != positions.end()) {
+        // Bring the old memo block numbers onto the fields, then the new values.
+        target->SetFilePosition(it->second);
+        if ((rc = target->GetandDeleteRecord(out)) != 0) break;
+        fill();
+        ++updated;
+      } else {
+        target->Unwind();
+        positions.emplace(k, live++);
+        ++added;
+      }
+    } else {
+      ++added;
+    }
+    if ((rc = target->GenerateDetailRecord(0)) != 0) break;
+    progress.Tick(n);
+  }
+  bool ok = rc == ZQ_END;
+  std::string message;
+  if (!ok) message = source->LastErrorMessage()[0] && target->LastErrorMessage()[0] == 0
+                         ? source->LastErrorMessage()
+                         : target->LastErrorMessage();
+  if (!ok && message.empty()) message = "the conversion stopped at record " + std::to_string(n);
+  if (target->_CloseOutput(ok) != 0 && ok) {
+    ok = false;
+    message = target->LastErrorMessage();
+  }
+  source->ConnectionClose();
+  if (!ok) return Fail(message);
+  for (size_t i = 0; i < checks.size(); ++i)
+    if (checks[i].cut > 0)
+      Warn(std::string("field ") + names[i] + ": " + std::to_string(checks[i].cut) + " values longer than " +
+           std::to_string(checks[i].width) + " bytes were cut");
+  for (size_t i = 0; i < checks.size(); ++i)
+    if (checks[i].blank_logicals > 0 && dbf_target)
+      Warn(std::string("field ") + names[i] + ": " + std::to_string(checks[i].blank_logicals) +
+           " blank logicals were written as F");
+  if (opts.mode == 2)
+    fprintf(stderr, "zqdb: %lld records updated, %lld added\n", static_cast<long long>(updated),
+            static_cast<long long>(added));
+  return 0;
+}

@@ -1,0 +1,131 @@
+#include "engine/csv_reader.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+
+CsvReader::~CsvReader() {
+  if (fd_ >= 0) close(fd_);
+  free(buf_);
+}
+
+bool CsvReader::Open(const std::string& path, std::string* error) {
+  fd_ = open(path.c_str(), O_RDONLY | O_CLOEXEC);
+  if (fd_ < 0) {
+    *error = "cannot open " + path + ": " + strerror(errno);
+    return false;
+  }
+  buf_ = static_cast<char*>(malloc(kBufSize));
+  if (buf_ == nullptr) {
+    *error = "out of memory";
+    return false;
+  }
+  return Rewind();
+}
+
+bool CsvReader::Rewind() {
+  if (lseek(fd_, 0, SEEK_SET) != 0) return false;
+  pos_ = len_ = 0;
+  eof_ = false;
+  line_ = record_line_ = 1;
+  consumed_ = 0;
+  error_.clear();
+  // A byte order mark at the start is not data.
+  if (Fill() && len_ >= 3 && memcmp(buf_, "\xEF\xBB\xBF", 3) == 0) pos_ = 3;
+  return true;
+}
+
+bool CsvReader::Fill() {
+  if (pos_ < len_) return true;
+  if (eof_) return false;
+  ssize_t n;
+  do n = read(fd_, buf_, kBufSize);
+  while (n < 0 && errno == EINTR);
+  if (n <= 0) {
+    eof_ = true;
+    if (n < 0) error_ = strerror(errno);
+    return false;
+  }
+  consumed_ += n;
+  pos_ = 0;
+  len_ = size_t(n);
+  return true;
+}
+
+bool CsvReader::Next() {
+  field_data_.clear();
+  ends_.clear();
+  if (!error_.empty() || !Fill()) return false;
+  record_line_ = line_;
+  bool quoted = false, in_field_quotes = false, after_quote = false;
+  for (;;) {
+    if (!Fill()) {
+      if (in_field_quotes) {
+        error_ = "a quoted field runs to the end of the file";
+        return false;
+      }
+      ends_.push_back(field_data_.size());
+      return true;
+    }
+    if (!in_field_quotes) {
+      // Copy a run of plain bytes at once.
+      const char* start = buf_ + pos_;
+      const char* end = buf_ + len_;
+      const char* p = start;
+      while (p < end && *p != ',' && *p != '\n' && *p != '\r' && *p != '"') ++p;
+      if (p > start) {
+        if (after_quote) {
+          error_ = "text behind a closing quote";
+          return false;
+        }
+        field_data_.append(start, size_t(p - start));
+        pos_ += size_t(p - start);
+        if (field_data_.size() > kMaxRecord) {
+          error_ = "a record longer than 64 MiB";
+          return false;
+        }
+        continue;
+      }
+      char c = buf_[pos_++];
+      if (c == ',') {
+        ends_.push_back(field_data_.size());
+        quoted = after_quote = false;
+      } else if (c == '\n' || c == '\r') {
+        if (c == '\r' && Fill() && buf_[pos_] == '\n') ++pos_;
+        ++line_;
+        ends_.push_back(field_data_.size());
+        return true;
+      } else {  // '"'
+        size_t field_start = ends_.empty() ? 0 : ends_.back();
+        if (quoted || field_data_.size() != field_start) {
+          error_ = "a quote inside an unquoted field";
+          return false;
+        }
+        quoted = in_field_quotes = true;
+      }
+    } else {
+      const char* start = buf_ + pos_;
+      const char* q = static_cast<const char*>(memchr(start, '"', len_ - pos_));
+      const char* stop = q ? q : buf_ + len_;
+      for (const char* k = start; k < stop; ++k) line_ += *k == '\n';
+      field_data_.append(start, size_t(stop - start));
+      pos_ += size_t(stop - start);
+      if (field_data_.size() > kMaxRecord) {
+        error_ = "a record longer than 64 MiB";
+        return false;
+      }
+      if (q == nullptr) continue;
+      ++pos_;  // the quote
+      if (Fill() && buf_[pos_] == '"') {  // a doubled quote is one quote
+        field_data_ += '"';
+        ++pos_;
+        continue;
+      }
+      in_field_quotes = false;
+      after_quote = true;
+    }
+  }
+}

@@ -1,0 +1,47 @@
+// A streaming RFC 4180 reader: fields separated by commas, records by CRLF or
+// LF, double quotes around fields that hold commas, quotes or line breaks.
+// Memory holds one record at a time whatever the file's size.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+class CsvReader {
+ public:
+  CsvReader() = default;
+  ~CsvReader();
+  CsvReader(const CsvReader&) = delete;
+  CsvReader& operator=(const CsvReader&) = delete;
+
+  bool Open(const std::string& path, std::string* error);
+  // Back to the first record.
+  bool Rewind();
+  // The next record's fields; false at the end or on an error (error() set).
+  // Fields stay valid until the next call.
+  bool Next();
+  size_t FieldCount() const { return ends_.size(); }
+  const char* Field(size_t i) const { return field_data_.data() + (i ? ends_[i - 1] : 0); }
+  size_t FieldLength(size_t i) const { return ends_[i] - (i ? ends_[i - 1] : 0); }
+  std::string FieldString(size_t i) const { return std::string(Field(i), FieldLength(i)); }
+  // 1-based line on which the current record starts.
+  int64_t Line() const { return record_line_; }
+  const std::string& error() const { return error_; }
+  int64_t BytesRead() const { return consumed_; }
+
+ private:
+  // Makes at least one byte available at pos_; false at the end of the file.
+  bool Fill();
+
+  static constexpr size_t kBufSize = 1 << 20;
+  static constexpr size_t kMaxRecord = 64 << 20;  // a longer record is an error
+  int fd_ = -1;
+  char* buf_ = nullptr;
+  size_t pos_ = 0, len_ = 0;
+  bool eof_ = false;
+  int64_t line_ = 1, record_line_ = 1, consumed_ = 0;
+  std::string field_data_;
+  std::vector<size_t> ends_;
+  std::string error_;
+};

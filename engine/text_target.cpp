@@ -1,0 +1,53 @@
+#include "engine/text_target.h"
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+
+#include "engine/text_types.h"
+
+ZQToText::ZQToText(OutputFormat format) : ZQExport(ZQSpokeDef{}, nullptr, false), format_(format) {
+  ReplaceValidTypes(const_cast<const ZQDType**>(TextTypes::Get().list));
+}
+
+ZQToText::~ZQToText() { _CloseOutput(false); }
+
+BATCHERR ZQToText::_OpenOutput(const ZQConnTarget& target) {
+  inserted_count_ = 0;
+  if (target.path.length() == 0) return ZQ_NO_FILENAME;
+  final_path_ = target.path.c_str();
+  temp_path_ = final_path_ + ".zqdb-part";
+  fd_ = open(temp_path_.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
+  if (fd_ < 0) return LogError(4, ZQ_CREATE_ERROR, "cannot create %s: %s", final_path_.c_str(), strerror(errno));
+  out_ = std::make_unique<OutBuf>(fd_);
+  writer_ = MakeWriter(format_, *out_);
+  writer_->Begin(*GetLayout(0));
+  target_.path = target.path;
+  return 0;
+}
+
+BATCHERR ZQToText::GenerateDetailRecord(int layout) {
+  if (layout != 0) return ZQ_INDEX_ERROR;
+  if (!writer_) return ZQ_NOT_OPEN;
+  writer_->Row(*GetLayout(0));
+  if (out_->failed()) return LogError(4, ZQ_WRITE_ERROR, "cannot write %s: %s", final_path_.c_str(), strerror(errno));
+  ++inserted_count_;
+  return 0;
+}
+
+BATCHERR ZQToText::_CloseOutput(bool keep) {
+  if (fd_ < 0) return 0;
+  writer_->End();
+  bool ok = out_->Flush();
+  writer_.reset();
+  out_.reset();
+  if (close(fd_) != 0) ok = false;
+  fd_ = -1;
+  if (keep && ok && rename(temp_path_.c_str(), final_path_.c_str()) == 0) return 0;
+  unlink(temp_path_.c_str());
+  if (keep) return LogError(4, ZQ_WRITE_ERROR, "cannot write %s", final_path_.c_str());
+  return 0;
+}

@@ -174,10 +174,13 @@ int dbcreat(const char* name, int count, ZQDBFIELD** fields, int version, bool p
   int rc = narrow ? dbhdr2(table, count, fields, vbyte) : dbhdr3(table, count, fields, vbyte, production);
   if (table.close(true) != 0) rc = -1;
   // An Enable table with more than 32 fields carries 0xFE, which reopens as a
-  // table with a memo file; an empty one is made so that it opens cleanly.
+  // table with a memo file, memo fields or not; an empty memo file is made so
+  // that it opens cleanly.
   if (!memo && vbyte != kNarrowManyFields) return rc;
 
-  uint8_t kind = NewMemoKind(dialect);
+  // 0xFE has bit 3 set, so it reopens as the dBASE IV form: its memo file
+  // gets that form's header whether or not the table has memo fields.
+  uint8_t kind = vbyte == kNarrowManyFields ? uint8_t{MEMO_DB4} : NewMemoKind(dialect);
   const char* ext = kind == MEMO_FPT ? "fpt" : kind == MEMO_SMT ? "smt" : "dbt";
   char path[4096];
   if (!memopath(name, ext, path, sizeof path)) return -1;

@@ -1,0 +1,94 @@
+// Memo files of every kind from fuzzed bytes, beside a small table: reads of a
+// range of blocks and lengths, then stores and frees on the same (scratch)
+// copy. Input: one byte that picks the kind, two bytes of length seed, then
+// the memo file.
+#include <unistd.h>
+
+#include <cstddef>
+#include <cstdint>
+#include <cstdio>
+#include <string>
+#include <sys/stat.h>
+
+#include "table/dbf.h"
+#include "table/memo.h"
+
+namespace {
+
+struct Kind {
+  uint8_t version;
+  int dialect;
+  const char* ext;
+};
+constexpr Kind kKinds[] = {
+    {0x83, DIALECT_DBASE3P, "dbt"},  // dBASE III
+    {0x8B, DIALECT_DBASE4, "dbt"},   // dBASE IV, 0x0101 or 0x0102 by the header
+    {0xF5, DIALECT_FOXPRO, "fpt"},
+    {0xE5, DIALECT_CLIPPER, "smt"},
+};
+
+const std::string& Dir() {
+  static const std::string dir = [] {
+    std::string d = "/tmp/zqdbse-memofuzz-" + std::to_string(getpid());
+    mkdir(d.c_str(), 0700);
+    return d;
+  }();
+  return dir;
+}
+
+bool Write(const std::string& path, const uint8_t* data, size_t size) {
+  FILE* f = fopen(path.c_str(), "wb");
+  if (f == nullptr) return false;
+  bool ok = size == 0 || fwrite(data, 1, size, f) == size;
+  return fclose(f) == 0 && ok;
+}
+
+// A wide table with one memo field and no records.
+bool WriteTable(const std::string& path, uint8_t version) {
+  uint8_t t[66] = {};
+  t[0] = version;
+  t[8] = 66;
+  t[10] = 11;
+  const char name[] = "NOTES";
+  for (int i = 0; name[i] != '\0'; ++i) t[32 + i] = uint8_t(name[i]);
+  t[32 + 11] = 'M';
+  t[32 + 16] = 10;
+  t[64] = 0x0D;
+  return Write(path, t, sizeof t);
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
+  if (size < 3 || size > (1u << 20)) return 0;
+  const Kind& kind = kKinds[data[0] % 4];
+  uint32_t seed = uint32_t(data[1]) | uint32_t(data[2]) << 8;
+  std::string table = Dir() + "/t.dbf";
+  std::string memo = Dir() + "/t." + kind.ext;
+  if (!WriteTable(table, kind.version) || !Write(memo, data + 3, size - 3)) return 0;
+
+  ZQDBFIELD* fields[kMaxFields] = {};
+  int dialect = kind.dialect;
+  ZQDBFILE* db = dbopen(nullptr, table.c_str(), fields, &dialect, true);
+  if (db == nullptr) return 0;
+  ZQString text;
+  uint32_t blocks = db->memoblksize != 0 ? uint32_t((size - 3) / db->memoblksize) + 2 : 4;
+  if (blocks > 64) blocks = 64;
+  for (uint32_t b = 0; b < blocks; ++b) {
+    db->memostat = 1;
+    getmemo(db, b, seed + b, text);
+  }
+  for (uint32_t b : {0x7FFFFFFFu, 0xFFFFFFFFu, 0x00010000u}) getmemo(db, b, 0xFFFFFFFFu, text);
+
+  // Stores and frees on this scratch copy: a damaged chain or header must
+  // end each call, never loop or write out of bounds.
+  std::string body(size_t(seed % 2000) + 1, 'm');
+  for (uint32_t b = 0; b < 6 && b < blocks; ++b) {
+    uint32_t at = putmemo(db, b, ZQString(body.c_str()));
+    if (at != 0) getmemo(db, at, uint32_t(body.size()), text);
+    deloldm(db, b + 1, int(seed % 5));
+    body.resize(body.size() / 2 + 1);
+  }
+  dbclose(fields, db);
+  return 0;
+}

@@ -184,7 +184,9 @@ BATCHERR ZQDbase::GetRecord(ZQRecord& record, int32_t n, int64_t* position, bool
         // text is copied once, and straight into the field when no code page
         // conversion stands between.
         int32_t kept = int32_t(bytescan::TrimRight(raw, size_t(length), ' '));
-        if (codepage != 0) {
+        // ASCII is the same in every code page: only text with other bytes
+        // goes through the conversion.
+        if (codepage != 0 && bytescan::HasHighBit(raw, size_t(kept))) {
           FieldText.CopyN(raw, kept, 0);
           ZQGlob::ExternalToInternal(codepage, FieldText);
           *field = FieldText;

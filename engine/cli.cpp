@@ -51,7 +51,7 @@ struct Args {
 };
 
 int Usage(const std::string& message) {
-  fprintf(stderr, "zqdb: %s\n%s", message.c_str(), kUsage);
+  fprintf(stderr, "zqdb: %s (zqdb --help shows the usage)\n", message.c_str());
   return kExitUsage;
 }
 
@@ -85,7 +85,10 @@ int ParseArgs(int argc, char** argv, Args* args) {
       fputs(kUsage, stdout);
       exit(0);
     } else if (a == "--dialect") {
-      if (!take(&args->source.dialect)) return Usage("--dialect needs a value");
+      if (!take(&args->source.dialect) || args->source.dialect.empty()) return Usage("--dialect needs a value");
+      SourcePtr probe(NewFromDbase(ZQSpokeDef{}));
+      if (!probe || !ApplyDialect(probe.get(), args->source.dialect))
+        return Usage("unknown dialect: " + args->source.dialect);
     } else if (a == "--codepage") {
       std::string v;
       if (!take(&v)) return Usage("--codepage needs a value");
@@ -106,7 +109,9 @@ int ParseArgs(int argc, char** argv, Args* args) {
       if (!take(&v)) return Usage("--format needs a value");
       if (!ParseFormat(v, &args->format)) return Usage("--format takes csv, jsonl or table, not " + v);
     } else if (a == "--to") {
-      if (!take(&args->convert.to)) return Usage("--to needs a value");
+      if (!take(&args->convert.to) || args->convert.to.empty()) return Usage("--to needs a value");
+      SourcePtr probe(NewFromDbase(ZQSpokeDef{}));
+      if (!probe || !ApplyDialect(probe.get(), args->convert.to)) return Usage("unknown dialect: " + args->convert.to);
     } else if (a == "--mode") {
       std::string v;
       if (!take(&v)) return Usage("--mode needs a value");
@@ -138,7 +143,10 @@ int ParseArgs(int argc, char** argv, Args* args) {
       args->files.push_back(a);
     }
   }
-  if (args->command.empty()) return Usage("no command given");
+  if (args->command.empty()) {
+    fputs(kUsage, stderr);
+    return kExitUsage;
+  }
   return 0;
 }
 
@@ -219,24 +227,13 @@ int CmdCat(const Args& args) {
 int CmdConvert(Args& args) {
   if (args.files.size() != 2) return Usage("convert takes a source and a target");
   if (args.convert.mode != 2 && !args.convert.key.empty()) return Usage("--key goes with --mode update");
-  if (!args.convert.to.empty()) {
-    // Checked here so that a wrong name is a usage error, before any file is touched.
-    SourcePtr probe(NewFromDbase(ZQSpokeDef{}));
-    if (!probe || !ApplyDialect(probe.get(), args.convert.to)) return Usage("unknown dialect: " + args.convert.to);
-  }
-  if (!args.source.dialect.empty()) {
-    SourcePtr probe(NewFromDbase(ZQSpokeDef{}));
-    if (!probe || !ApplyDialect(probe.get(), args.source.dialect))
-      return Usage("unknown dialect: " + args.source.dialect);
-  }
   args.convert.source = args.source;
   return RunConvert(args.files[0], args.files[1], args.convert);
 }
 
-void QuietSink(void*, int level, BATCHERR, const char* message) {
-  // Failures come back as results and are reported once by the command;
-  // layout differences and other warnings are shown as they happen.
-  if (level < 4) fprintf(stderr, "zqdb: warning: %s\n", message);
+void QuietSink(void*, int, BATCHERR, const char*) {
+  // Messages come back through the spokes' last error and are reported once
+  // by the command that failed.
 }
 
 }  // namespace

@@ -287,16 +287,44 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
   if (!target->SupportMode(mode)) return Fail("the target does not support this mode");
   target->SetMode(mode);
 
-  // Layout 0 of the target, from the source's.
+  // Layout 0 of the target: an existing table's own when records are added
+  // to it (source fields go to the fields of the same name), else one built
+  // from the source's.
   ZQRecord& out = *target->GetLayout(0);
   out.ClearFields();
+  ZQConnTarget t;
+  t.path = dst.c_str();
+  bool existing = dbf_target && opts.mode != 0 && access(dst.c_str(), F_OK) == 0;
+  if (existing && target->MakeFields(out, t) != 0) {
+    std::string message = target->LastErrorMessage();
+    return Fail(message.empty() ? "cannot read the layout of " + dst : message);
+  }
   int cap = target->MaxFieldCount();
   if (auto* d = dynamic_cast<ZQToDbase*>(target.get()); d != nullptr && opts.mode == 0)
     cap = std::min(cap, d->CreateFieldCap());
   std::vector<std::string> names;
   std::vector<FieldCheck> checks;
   std::vector<int> from;  // source field of each target field
-  for (int i = 0; i < in.FieldCount(); ++i) {
+  if (existing) {
+    std::vector<bool> used(size_t(in.FieldCount()), false);
+    for (int j = 0; j < out.FieldCount(); ++j) {
+      ZQField* f = out[j];
+      target->FormatSpokeField(f, nullptr);
+      int match = -1;
+      for (int i = 0; i < in.FieldCount() && match < 0; ++i)
+        if (!used[size_t(i)] && (Lower(in[i]->Name()) == Lower(f->Name()) ||
+                                 Lower(TargetName(target.get(), in[i]->Name(), {})) == Lower(f->Name())))
+          match = i;
+      if (match < 0) Warn(std::string("field ") + f->Name() + " of the table has no source field: left blank");
+      else used[size_t(match)] = true;
+      names.push_back(f->Name());
+      checks.push_back(FieldCheck{char(f->DataType().Usage()), f->Length()});
+      from.push_back(match);
+    }
+    for (int i = 0; i < in.FieldCount(); ++i)
+      if (!used[size_t(i)]) Warn(std::string("field ") + in[i]->Name() + " is left out: the table has no such field");
+  }
+  for (int i = 0; i < in.FieldCount() && !existing; ++i) {
     ZQField* s = in[i];
     if (int(names.size()) == cap) {
       Warn(std::string("field ") + s->Name() + " and those behind it are left out: the target keeps " +
@@ -327,15 +355,16 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
   for (const std::string& k : opts.key) {
     int found = -1;
     for (size_t i = 0; i < from.size(); ++i)
-      if (Lower(in[from[i]]->Name()) == Lower(k) || Lower(names[i]) == Lower(k)) found = int(i);
+      if ((from[i] >= 0 && Lower(in[from[i]]->Name()) == Lower(k)) || Lower(names[i]) == Lower(k)) found = int(i);
     if (found < 0) return Fail("--key names no field: " + k);
     key.push_back(found);
   }
   if (opts.mode == 2 && key.empty()) return Fail("update mode needs --key");
 
-  ZQConnTarget t;
-  t.path = dst.c_str();
-  if (target->_OpenOutput(t) != 0) return Fail(target->LastErrorMessage());
+  if (target->_OpenOutput(t) != 0) {
+    std::string message = target->LastErrorMessage();
+    return Fail(message.empty() ? "cannot create " + dst : message);
+  }
 
   // Update mode: one pass over the table maps each key to its position.
   std::unordered_map<std::string, int64_t> positions;
@@ -363,7 +392,10 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
   int32_t n = 0;
   int64_t updated = 0, added = 0;
   auto fill = [&]() {
-    for (size_t i = 0; i < from.size(); ++i) CopyValue(out[int(i)], in[from[i]], &checks[i]);
+    for (size_t i = 0; i < from.size(); ++i) {
+      if (from[i] >= 0) CopyValue(out[int(i)], in[from[i]], &checks[i]);
+      else out[int(i)]->Blank();
+    }
   };
   for (;; ++n) {
     rc = source->GetRecord(n);

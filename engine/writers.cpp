@@ -246,17 +246,38 @@ class TableWriter : public RecordWriter {
  private:
   static constexpr size_t kMaxWidth = 40;
 
+  // Widths count characters, not bytes: a UTF-8 sequence is one column.
+  static size_t Columns(const char* s, size_t n) {
+    size_t c = 0;
+    for (size_t k = 0; k < n; ++k) c += (uint8_t(s[k]) & 0xC0) != 0x80;
+    return c;
+  }
+  // Bytes of the first `cols` characters of `s`.
+  static size_t PrefixBytes(const char* s, size_t n, size_t cols) {
+    size_t k = 0, c = 0;
+    while (k < n) {
+      if ((uint8_t(s[k]) & 0xC0) != 0x80) {
+        if (c == cols) break;
+        ++c;
+      }
+      ++k;
+    }
+    return k;
+  }
+
   void Cell(int i, const char* s, size_t n) {
     size_t w = widths_[size_t(i)];
     if (i) out_.Put("  ", 2);
-    if (n > w) {
-      out_.Put(s, w > 3 ? w - 3 : w);
+    size_t cols = Columns(s, n);
+    if (cols > w) {
+      size_t keep = w > 3 ? w - 3 : w;
+      out_.Put(s, PrefixBytes(s, n, keep));
       if (w > 3) out_.Put("...", 3);
       return;
     }
     out_.Put(s, n);
     if (size_t(i) + 1 < widths_.size())
-      for (size_t k = n; k < w; ++k) out_.Put(' ');
+      for (size_t k = cols; k < w; ++k) out_.Put(' ');
   }
 
   OutBuf& out_;

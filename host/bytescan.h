@@ -83,6 +83,15 @@ inline bool HasCsvSpecial(const char* p, size_t n) {
   return hit;
 }
 
+// True when some byte of `p[0..n)` has its high bit set (is not ASCII).
+inline bool HasHighBit(const char* p, size_t n) {
+  size_t i = 0;
+  uint64_t acc = 0;
+  for (; i + 8 <= n; i += 8) acc |= Load64(p + i);
+  for (; i < n; ++i) acc |= uint8_t(p[i]);
+  return (acc & kHighs) != 0;
+}
+
 // HasCsvSpecial for a buffer that may be read up to 15 bytes past `n`
 // (the bytes there are ignored).
 inline bool HasCsvSpecialPadded(const char* p, size_t n) {

@@ -1,5 +1,7 @@
 #include "host/codepage.h"
 
+#include "host/bytescan.h"
+
 #include <iconv.h>
 
 #include <cstdio>
@@ -103,18 +105,20 @@ const CodePageMap* CodePageTable(int codepage) {
 void CodePageToUtf8(int codepage, ZQString& text) {
   int32_t n = text.length();
   const auto* p = reinterpret_cast<const uint8_t*>(text.c_str());
-  int32_t high = 0;
-  for (int32_t i = 0; i < n; ++i) high += p[i] >> 7;
-  if (high == 0) return;  // plain ASCII reads the same in every code page here
+  // Plain ASCII reads the same in every code page here.
+  if (!bytescan::HasHighBit(text.c_str(), size_t(n))) return;
   const CodePageMap* map = CodePageTable(codepage);
   if (map == nullptr) return;
-  static ZQString out;  // scratch reused across calls: no allocation per field
-  if (!out.Allocate(n + high * 3)) return;
+  static ZQString out;  // scratch swapped with the text: no allocation per field
+  if (!out.Allocate(n * 3)) return;
   char* o = out.GetBuffer();
   int32_t k = 0;
-  for (int32_t i = 0; i < n; ++i) k += PutUtf8(map->to_unicode[p[i]], o + k);
+  for (int32_t i = 0; i < n; ++i) {
+    if (p[i] < 0x80) o[k++] = char(p[i]);
+    else k += PutUtf8(map->to_unicode[p[i]], o + k);
+  }
   out.SetLength(k);
-  text = out;
+  text.Swap(out);
 }
 
 void Utf8ToCodePage(int codepage, ZQString& text) {
@@ -166,5 +170,5 @@ void Utf8ToCodePage(int codepage, ZQString& text) {
     o[k++] = b < 0x80 ? char(b) : '?';
   }
   out.SetLength(k);
-  text = out;
+  text.Swap(out);
 }

@@ -50,7 +50,9 @@ void ZQField::AssignNumberText(const char* p, int32_t n) {
   p += lead;
   n -= lead;
   n = int32_t(bytescan::TrimRight(p, size_t(n), ' '));
-  if (n == 0) {
+  // A field of asterisks is how dBASE marks a number that didn't fit and
+  // other writers mark a number left empty: no value either way.
+  if (n == 0 || (p[0] == '*' && bytescan::SkipLeft(p, size_t(n), '*') == size_t(n))) {
     Blank();
     return;
   }
@@ -118,6 +120,12 @@ void ZQField::operator=(double value) {
 }
 
 void ZQField::operator=(const ZQDateTime& value) {
+  // Julian day 0 at midnight is what a date-time of zero bytes decodes to:
+  // no value, not a day in 4713 BC.
+  if (int64_t{value.Days()} + kZQEpochJulianDay == 0 && value.Seconds() == 0) {
+    Blank();
+    return;
+  }
   datetime_ = value;
   held_ = Held::kDateTime;
 }
@@ -167,15 +175,79 @@ void ZQField::RenderInto(ZQString& text) {
   text = out;
 }
 
+namespace {
+
+// Writes the number text `p` with exactly `dec` decimals (rounded half away
+// from zero) into `out`; false when `p` isn't a plain decimal number.
+bool FixDecimals(const char* p, int32_t n, int dec, ZQString& out) {
+  int32_t i = 0;
+  bool neg = false;
+  if (i < n && (p[i] == '-' || p[i] == '+')) neg = p[i++] == '-';
+  int32_t int_start = i;
+  while (i < n && p[i] >= '0' && p[i] <= '9') ++i;
+  int32_t int_end = i, frac_start = i, frac_end = i;
+  if (i < n && p[i] == '.') {
+    frac_start = ++i;
+    while (i < n && p[i] >= '0' && p[i] <= '9') ++i;
+    frac_end = i;
+  }
+  if (i != n || (int_end == int_start && frac_end == frac_start)) return false;
+  // Digits: the integer part, then exactly `dec` fraction digits.
+  char digits[400];
+  int32_t k = 0;
+  for (int32_t j = int_start; j < int_end && k < 300; ++j) digits[k++] = p[j];
+  if (k == 0) digits[k++] = '0';
+  int32_t int_len = k;
+  for (int d = 0; d < dec && k < 399; ++d) {
+    int32_t j = frac_start + d;
+    digits[k++] = j < frac_end ? p[j] : '0';
+  }
+  if (frac_start + dec < frac_end && p[frac_start + dec] >= '5') {
+    int32_t j = k - 1;
+    while (j >= 0 && digits[j] == '9') digits[j--] = '0';
+    if (j >= 0) {
+      ++digits[j];
+    } else {  // 9.99 -> 10.0: one more integer digit
+      memmove(digits + 1, digits, size_t(k));
+      digits[0] = '1';
+      ++k;
+      ++int_len;
+    }
+  }
+  // Leading zeros of the integer part go, but one digit stays.
+  int32_t lead = 0;
+  while (lead < int_len - 1 && digits[lead] == '0') ++lead;
+  bool zero = true;
+  for (int32_t j = lead; j < k; ++j) zero = zero && digits[j] == '0';
+  out = "";
+  if (neg && !zero) out += '-';
+  out.Append(digits + lead, int_len - lead);
+  if (dec > 0) {
+    out += '.';
+    out.Append(digits + int_len, k - int_len);
+  }
+  return true;
+}
+
+}  // namespace
+
 void ZQField::RenderText(ZQString& out, int flag) {
   char buf[64];
   switch (held_) {
     case Held::kBlank: out = ""; return;
-    case Held::kText: out = text_; return;
+    case Held::kText:
+      // The plain form of a number has the type's decimals; a number held
+      // as text is brought to them without going through a double, so that
+      // long numbers keep all their digits.
+      if (flag == 0 && type_.Family() == FT_NUMERIC &&
+          FixDecimals(text_.c_str(), text_.length(), type_.DecimalPlaces(), out))
+        return;
+      out = text_;
+      return;
     case Held::kLong: snprintf(buf, sizeof buf, "%lld", static_cast<long long>(long_)); break;
     case Held::kDouble:
       if (!std::isfinite(double_)) snprintf(buf, sizeof buf, "%s", "");
-      else if (flag == 1 && type_.Family() == FT_NUMERIC)
+      else if (type_.Family() == FT_NUMERIC)
         snprintf(buf, sizeof buf, "%.*f", int(type_.DecimalPlaces()), double_);
       else snprintf(buf, sizeof buf, "%.17g", double_);
       break;

@@ -68,6 +68,8 @@ class ZQString {
   void ToUpper();
   void ToLower();
   void StripChars(bool leading, bool trailing, char c);
+  // Exchanges contents with `other` (no copy).
+  void Swap(ZQString& other) noexcept;
   // Takes the value that NextKeyword left in `in`.
   void Extract(const ZQString& in);
 

@@ -24,39 +24,46 @@ int64_t BlockOffset(const ZQDBFILE* file, uint32_t block) {
 
 // Appends up to `count` bytes from the present position; the count that came.
 int64_t AppendBytes(ZQFileProxy& f, ZQString& text, int64_t count) {
-  if (count <= 0) return 0;
   int32_t start = text.length();
+  if (count <= 0 || count > INT32_MAX - 1 - start) return 0;
   if (!text.Allocate(int32_t(start + count))) return 0;
   int32_t got = f.read(text.GetBuffer() + start, int32_t(count));
   text.SetLength(start + got);
   return got;
 }
 
-// dBASE III: the text up to 0x1A, the end of the file or 32,000 bytes.
-MemoRead ReadDb3(ZQFileProxy& f, int64_t avail, ZQString& text) {
-  int64_t limit = avail < kDb3MaxText ? avail : kDb3MaxText;
-  while (text.length() < limit) {
-    int64_t want = limit - text.length() < kReadPiece ? limit - text.length() : kReadPiece;
+// dBASE III: the text up to 0x1A, the end of the file or 32,000 bytes. A
+// block with no byte at all lies at or past the end: a damaged pointer.
+MemoRead ReadDb3(ZQFileProxy& f, ZQString& text) {
+  while (text.length() < kDb3MaxText) {
+    int32_t want = kDb3MaxText - text.length() < kReadPiece ? kDb3MaxText - text.length() : kReadPiece;
     int32_t start = text.length();
-    if (AppendBytes(f, text, want) == 0) break;
+    if (AppendBytes(f, text, want) == 0) return start == 0 ? MemoRead::kDamaged : MemoRead::kOk;
     const char* piece = text.c_str() + start;
     const void* end = memchr(piece, kDb3Terminator, size_t(text.length() - start));
     if (end != nullptr) {
       text.SetLength(int32_t(static_cast<const char*>(end) - text.c_str()));
       break;
     }
+    if (text.length() - start < want) break;  // the end of the file
   }
   return MemoRead::kOk;
 }
 
-// A text of `count` bytes at the present position, `avail` bytes being left in
-// the file. A count the file can't hold reads what there is and is damage.
-MemoRead ReadCounted(ZQFileProxy& f, int64_t count, int64_t avail, ZQString& text) {
+// A text of `count` bytes at `off` in the file. Counts up to the file
+// object's buffer size are read as they stand, the short read finding the end
+// of the file; a larger count is first held against the file's size, so that
+// a damaged length never sets the size of an allocation. A count the file
+// can't hold reads what there is and is damage.
+MemoRead ReadCounted(ZQFileProxy& f, int64_t count, int64_t off, ZQString& text) {
   if (count < 0) return MemoRead::kDamaged;
-  bool cut = count > avail;
-  int64_t want = cut ? avail : count;
-  if (AppendBytes(f, text, want) != want) return MemoRead::kDamaged;
-  return cut ? MemoRead::kDamaged : MemoRead::kOk;
+  int64_t want = count;
+  if (count > ZQFileProxy::kBufferSize) {
+    int64_t avail = f.size() - off;
+    if (avail < want) want = avail < 0 ? 0 : avail;
+  }
+  if (AppendBytes(f, text, want) != count) return MemoRead::kDamaged;
+  return MemoRead::kOk;
 }
 
 // Opens the memo file with extension `ext`, then with it upper-cased.
@@ -157,11 +164,9 @@ MemoRead readmemo(ZQDBFILE* file, uint32_t block, uint32_t length, ZQString& tex
   f.clearErrors();
   int64_t off = BlockOffset(file, block);
   if (off < 0 || f.seek(off, 0) < 0) return MemoRead::kSeekFailed;
-  int64_t avail = f.size() - off;
-  if (avail <= 0) return MemoRead::kDamaged;
   switch (file->memokind) {
-    case MEMO_DB3: return ReadDb3(f, avail, text);
-    case MEMO_SMT: return ReadCounted(f, length, avail, text);
+    case MEMO_DB3: return ReadDb3(f, text);
+    case MEMO_SMT: return ReadCounted(f, length, off, text);
     case MEMO_DB4:
     case MEMO_DB4FREE:
     case MEMO_FPT: {
@@ -179,7 +184,7 @@ MemoRead readmemo(ZQDBFILE* file, uint32_t block, uint32_t length, ZQString& tex
         // count is the total length less that word.
         count = int64_t{GetLe32(head + kDb4TotalLength)} - GetLe16(head + kDb4TextOffset);
       }
-      return ReadCounted(f, count, avail - kMemoBlockHead, text);
+      return ReadCounted(f, count, off + kMemoBlockHead, text);
     }
     default: return MemoRead::kNoFile;
   }

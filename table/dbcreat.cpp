@@ -164,6 +164,13 @@ int dbcreat(const char* name, int count, ZQDBFIELD** fields, int version, bool p
   int dialect = version & ~kMemoFlag;
   bool memo = (version & kMemoFlag) != 0;
   bool narrow = IsNarrowDialect(dialect);
+  // dBASE II has no memo: its reader refuses a table with a memo field, so
+  // such a table is refused here rather than written unreadable.
+  if (dialect == DIALECT_DBASE2) {
+    if (memo) return -1;
+    for (int i = 0; i < count; ++i)
+      if (IsMemoType(fields[i]->type)) return -1;
+  }
   // A record length that 16 bits can't hold would wrap into a table that no
   // reader can use: refused before any file is made.
   if (RecordLength(count, fields, narrow) > UINT16_MAX) return -1;

@@ -221,6 +221,24 @@ TEST(Create, WideEdgeCases) {
   std::string path = tests::MemoScratch("wbig.dbf");
   EXPECT_EQ(dbcreat(path.c_str(), wide.Count(), wide.Ptrs(), DIALECT_CLIPPER, false), -1);
   EXPECT_FALSE(ZQFileProxy::fileExists(path.c_str()));
+
+  // dBASE II can't read a memo field back: refused, nothing made.
+  Fields memo;
+  memo.Add("NOTES", 'M', 10);
+  path = tests::MemoScratch("d2memo.dbf");
+  EXPECT_EQ(dbcreat(path.c_str(), 1, memo.Ptrs(), DIALECT_DBASE2 | kMemo, false), -1);
+  EXPECT_EQ(dbcreat(path.c_str(), 1, memo.Ptrs(), DIALECT_DBASE2, false), -1);
+  EXPECT_FALSE(ZQFileProxy::fileExists(path.c_str()));
+  // Enable takes it, with a dBASE III memo file.
+  path = tests::MemoScratch("d3memo.dbf");
+  ASSERT_EQ(dbcreat(path.c_str(), 1, memo.Ptrs(), DIALECT_ENABLE | kMemo, false), 0);
+  ZQDBFIELD* fields[kMaxFields] = {};
+  int v = DIALECT_ENABLE;
+  ZQDBFILE* db = dbopen(nullptr, path.c_str(), fields, &v, true);
+  ASSERT_NE(db, nullptr);
+  EXPECT_EQ(db->memokind, MEMO_DB3);
+  EXPECT_EQ(db->memofailed, 0);
+  dbclose(fields, db);
 }
 
 ZQDBFILE* OpenRw(const std::string& path, int dialect, ZQDBFIELD** fields) {

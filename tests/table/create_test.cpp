@@ -263,7 +263,9 @@ TEST(Put, AppendsRewritesAndCloseStampsTheCount) {
   int live = -1;
   EXPECT_EQ(dbget(db, 0, buf, &live), 0);  // a read after writes seeks back
   EXPECT_EQ(std::string(buf, 4), "ann ");
-  EXPECT_EQ(dbput(db, "dee ", 2, 1), 0);   // and a write after a read
+  EXPECT_EQ(dbget(db, 2, buf, &live), 0);  // behind the last record: the end state
+  EXPECT_EQ(live, 0);
+  EXPECT_EQ(dbput(db, "dee ", 2, 1), 0);   // a write after a read, past that state
   EXPECT_EQ(dbclose(fields, db), 0);
   Bytes b = tests::ReadFile(path);
   ASSERT_EQ(b.size(), 66u + 3 * 5 + 1);  // header 32 + 32 + 2

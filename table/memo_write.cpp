@@ -246,7 +246,8 @@ int deloldm(ZQDBFILE* file, uint32_t block, int blocks) {
   // the blocks are then lost, as in the other kinds.
   if (head > end && head != kFreeChainEnd) return 0;
   uint32_t previous = 0, next = head;
-  if (head < block) {
+  // A head of 0xFFFF is an empty chain: the run becomes its first entry.
+  if (head < block && head != kFreeChainEnd) {
     previous = head;
     while (true) {
       if (previous >= end || !WritableRun(file, previous, 1)) return 0;

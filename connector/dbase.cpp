@@ -44,7 +44,15 @@ BATCHERR ZQDbase::MakeFields(ZQRecord& layout, const ZQConnTarget& target) {
   if (Table == nullptr) {
     if (target.path.length() == 0) return ZQ_NO_FILENAME;
     opened = target.path.c_str();
-    if (BATCHERR rc = DBOpenFile(opened, false); rc != 0) return rc;
+    if (BATCHERR rc = DBOpenFile(opened, false); rc != 0) {
+      // A table left open behind a memo failure gets no layout and no
+      // buffer: what an earlier table left must not be read against it.
+      layout.ClearFields();
+      ZQGlob::freebuf(RecordBuffer);
+      RecordBuffer = nullptr;
+      RecordBufferSize = 0;
+      return rc;
+    }
   }
   if (!ZQGlob::growbuf(Table->reclen, RecordBuffer, RecordBufferSize, nullptr)) return ZQ_NO_MEMORY;
   layout.ClearFields();
@@ -69,7 +77,9 @@ BATCHERR ZQDbase::MakeFields(ZQRecord& layout, const ZQConnTarget& target) {
   }
   if (opened[0] != '\0') DescribeIndices(opened);
   RecordMap.Reset();
-  CurrentLogical = CurrentPhysical = 0;
+  // Nothing read yet: a first request for record 1 must not take physical
+  // record 0 for logical record 0 unread (it may be deleted).
+  CurrentLogical = CurrentPhysical = -1;
   HighRecord = -1;
   DeletedSkipped = 0;
   return 0;
@@ -102,6 +112,11 @@ BATCHERR ZQDbase::ReadRecord(int32_t n) {
     if (physical >= count) return ZQ_END;
     if (dbget(Table, physical, RecordBuffer, &live) != 0)
       return OwnerSpoke()->LogError(4, ZQ_READ_ERROR, lgettext(u"Error retrieving record %ld"), n);
+    // A record wholly behind the end of the file (dbget gave 0 and dropped
+    // its position): so is every later one, and none of them is live. The
+    // table ends here rather than after a read for each record the header
+    // promises, which may be two billion.
+    if (Table->filepos == -1) return ZQ_END;
     if (live) {
       ++logical;
       if (logical > HighRecord) {
@@ -167,7 +182,11 @@ BATCHERR ZQDbase::GetRecord(ZQRecord& record, int32_t n, int64_t* position, bool
       case 'I': {
         int32_t v = 0;
         FieldText.CopyN(raw, length, 0);
-        field->DataType().Input(FieldText, 0, v);
+        // A dialect without the Integer type (dialect 5 reading a Visual
+        // FoxPro table) gives the column a text type, which reads no binary
+        // number: the bytes are a 32-bit little-endian integer all the same.
+        const ZQDType& own = field->DataType();
+        (own.BinaryWidth() == 4 ? own : BinaryLong).Input(FieldText, 0, v);
         *field = v;
         break;
       }

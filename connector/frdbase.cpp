@@ -60,7 +60,9 @@ const ZQConnTargetInfo* ZQFromDbase::GetTargetInfo() const {
 
 int64_t ZQFromDbase::EstimateRecordCount() {
   if (dbase.Table == nullptr) return 0;
-  return int64_t{TableCount(dbase.Table)} - dbase.DeletedSkipped;
+  // A count that is negative as a signed number reads as an empty table.
+  int64_t live = int64_t{TableCount(dbase.Table)} - dbase.DeletedSkipped;
+  return live > 0 ? live : 0;
 }
 
 BATCHERR ZQFromDbase::MakeFields() {

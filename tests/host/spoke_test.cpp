@@ -83,13 +83,17 @@ TEST(ZQFieldTest, RenderFlagsDatesAndNumbers) {
   ZQField n(numeric, "AMOUNT");
   n = 1.5;
   ZQString out;
-  n.RenderText(out, 0);  // flag 0: the plain number form
-  EXPECT_EQ(Text(out), "1.5");
-  n.RenderText(out, 1);  // flag 1: by the field's own form (its decimals)
+  n.RenderText(out, 0);  // a number: with the type's decimals
   EXPECT_EQ(Text(out), "1.50");
-  n = ZQString("  12.25 ");  // text keeps its digits, blanks go
-  EXPECT_EQ(Text(n.StringRef()), "12.25");
-  EXPECT_DOUBLE_EQ(n.DoubleVal(), 12.25);
+  n.RenderText(out, 1);
+  EXPECT_EQ(Text(out), "1.50");
+  n = ZQString("  12.5 ");  // text keeps its digits, blanks go
+  n.RenderText(out, 0);     // flag 0: the plain number form, brought to 2 decimals
+  EXPECT_EQ(Text(out), "12.50");
+  n.RenderText(out, 1);  // flag 1: the text as it came
+  EXPECT_EQ(Text(out), "12.5");
+  EXPECT_EQ(Text(n.StringRef()), "12.5");
+  EXPECT_DOUBLE_EQ(n.DoubleVal(), 12.5);
   n = ZQString("     ");
   EXPECT_TRUE(n.IsBlank());
 

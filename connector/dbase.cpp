@@ -112,6 +112,10 @@ BATCHERR ZQDbase::ReadRecord(int32_t n) {
     if (physical >= count) return ZQ_END;
     if (dbget(Table, physical, RecordBuffer, &live) != 0)
       return OwnerSpoke()->LogError(4, ZQ_READ_ERROR, lgettext(u"Error retrieving record %ld"), n);
+    // Nothing at all came: the file ended before the count of its header.
+    // The records the header still promises are not there, so the table
+    // ends here rather than after billions of empty reads.
+    if (!live && Table->filepos == -1) return ZQ_END;
     // A record wholly behind the end of the file (dbget gave 0 and dropped
     // its position): so is every later one, and none of them is live. The
     // table ends here rather than after a read for each record the header

@@ -65,6 +65,7 @@ expect_run 0 info "$WORK/fox.dbf" --memo always && expect_out "dialect:     6 (F
 } >"$WORK/db2.dbf"
 expect_run 0 cat "$WORK/db2.dbf" --dialect 0 --format jsonl && expect_out '{"NAME":"hello"}'
 expect_run 0 cat "$WORK/db2.dbf" --dialect "dbase ii" --format jsonl && expect_out '{"NAME":"hello"}'
-expect_run 1 cat "$WORK/db2.dbf" && expect_err "zqdb: Error opening data file"
+expect_run 1 cat "$WORK/db2.dbf" --dialect 2 && expect_err "zqdb: Error opening data file"
+expect_run 0 cat "$WORK/db2.dbf" --format jsonl && expect_out '{"NAME":"hello"}'
 
 finish

@@ -382,52 +382,11 @@ BATCHERR ZQToDbase::GenerateDetailRecord(int layout_number) {
 }
 
 bool ZQToDbase::ReadOldMemo(uint32_t block) {
-  ZQDBFILE* t = dbase.Table;
-  MemoScratch = "";
-  ZQFileProxy& m = t->memofile;
-  if (!m.isOpen() || t->hasmemo == 0) return false;
-  int64_t size = m.size();
-  int64_t at = int64_t(int32_t(block * uint32_t(t->memoblksize)));
-  if (at < 0 || at >= size || m.seek(at, 0) < 0) return false;
-  int64_t left = size - at;
-  auto append = [&](int64_t n) {
-    // A damaged length never reads past the end of the file.
-    if (n < 0) n = 0;
-    if (n > left) n = left;
-    if (!MemoScratch.Allocate(int32_t(n))) return false;
-    int32_t got = m.read(MemoScratch.GetBuffer(), int32_t(n));
-    MemoScratch.SetLength(got);
-    return true;
-  };
-  switch (t->memokind) {
-    case MEMO_DB3: {
-      for (int32_t k = 0; k < 32000; ++k) {
-        int c = m.getch();
-        if (c < 0 || c == 0x1A) break;
-        MemoScratch += char(c);
-      }
-      return true;
-    }
-    case MEMO_DB4:
-    case MEMO_DB4FREE: {
-      uint8_t h[8];
-      if (m.read(reinterpret_cast<char*>(h), 8) != 8) return false;
-      int64_t total = GetLe32(h + 4);
-      left -= 8;
-      return append(total - GetLe16(h + 2));
-    }
-    case MEMO_FPT: {
-      uint8_t h[8];
-      if (m.read(reinterpret_cast<char*>(h), 8) != 8) return false;
-      if (GetBe32(h) != 1) {
-        t->memostat = 0;
-        return false;
-      }
-      left -= 8;
-      return append(GetBe32(h + 4));
-    }
-    default: return false;
-  }
+  // The old memo is read as the memo engine reads any memo; only its length
+  // matters here. A block of another FPT type has no text to measure.
+  MemoRead r = readmemo(dbase.Table, block, 0, MemoScratch);
+  if (r == MemoRead::kNotText) dbase.Table->memostat = 0;
+  return r == MemoRead::kOk;
 }
 
 BATCHERR ZQToDbase::FormatDBMemo(char* dest, ZQField* field) {

@@ -3,6 +3,7 @@
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <cctype>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -16,6 +17,7 @@
 #include "engine/writers.h"
 #include "host/zqglob.h"
 #include "host/zqutil.h"
+#include "table/memo.h"
 
 namespace {
 
@@ -163,6 +165,34 @@ const char* DialectName(int dialect) {
   return dialect >= 0 && dialect <= 10 ? kNames[dialect] : "?";
 }
 
+// The memo file line of `info`: its name, kind and block size.
+void PrintMemo(const std::string& path, ZQFromDbase* spoke) {
+  const ZQDBFILE* t = spoke->TableHandle();
+  if (t == nullptr || !t->hasmemo) {
+    printf("memo:        none\n");
+    return;
+  }
+  const char* kind = "?";
+  const char* ext = "dbt";
+  switch (t->memokind) {
+    case MEMO_DB3: kind = "dBASE III"; break;
+    case MEMO_DB4: kind = "dBASE IV"; break;
+    case MEMO_DB4FREE: kind = "dBASE IV, with a free-block chain"; break;
+    case MEMO_FPT: kind = "FoxPro", ext = "fpt"; break;
+    case MEMO_SMT: kind = "Clipper SMT", ext = "smt"; break;
+  }
+  char name[4200];
+  std::string upper = ext;
+  for (char& c : upper) c = char(toupper(static_cast<unsigned char>(c)));
+  if (!memopath(path.c_str(), ext, name, sizeof name) || access(name, F_OK) != 0)
+    memopath(path.c_str(), upper.c_str(), name, sizeof name);
+  if (t->memofailed)
+    printf("memo:        %s (%s) could not be opened or was refused\n", name, kind);
+  else
+    printf("memo:        %s (%s, blocks of %u bytes%s)\n", name, kind, unsigned(t->memoblksize),
+           t->memooff ? ", memos switched off in its header" : "");
+}
+
 int CmdInfo(const Args& args) {
   if (args.files.size() != 1) return Usage("info takes one table");
   SourcePtr spoke;
@@ -183,6 +213,7 @@ int CmdInfo(const Args& args) {
   printf("records:     %lld in the header, %lld live\n", static_cast<long long>(header_count),
          static_cast<long long>(live));
   printf("layout:      header %u bytes, record %u bytes\n", facts.header_length, facts.record_length);
+  PrintMemo(args.files[0], spoke.get());
   ZQRecord* layout = spoke->GetLayout(0);
   printf("fields:      %d\n", layout->FieldCount());
   printf("  %-4s %-11s %-4s %5s %4s\n", "#", "name", "type", "width", "dec");

@@ -171,7 +171,7 @@ bool ZQString::CopyN(const ZQString& s, int32_t length, int32_t from) {
   if (from < 0 || from > s.len_) return false;
   if (length < 0 || length > s.len_ - from) length = s.len_ - from;
   if (this == &s) {
-    memmove(data_, data_ + from, size_t(length));
+    if (length > 0) memmove(data_, data_ + from, size_t(length));  // an empty string has no buffer
     SetLength(length);
     return true;
   }

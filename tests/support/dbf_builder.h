@@ -6,6 +6,9 @@
 //                    .Record({"alice", "1.50"}).Deleted({"bob", "2.00"}).Build();
 #pragma once
 
+#include <sys/stat.h>
+#include <unistd.h>
+
 #include <cstdint>
 #include <cstdio>
 #include <cstdlib>
@@ -153,6 +156,24 @@ inline std::string WriteTemp(const std::string& name, const Bytes& bytes) {
   if (!bytes.empty()) fwrite(bytes.data(), 1, bytes.size(), f);
   fclose(f);
   return path;
+}
+
+// A path in a directory of this process alone: the test programs (and the
+// sanitizer build) run side by side, and each would otherwise overwrite the
+// others' files. The directory goes when the process ends.
+inline std::string ScratchPath(const std::string& name) {
+  static const std::string dir = [] {
+    std::string d = "/tmp/zqdbse-tests-" + std::to_string(getpid());
+    mkdir(d.c_str(), 0700);
+    static std::string to_remove = d;
+    atexit([] {
+      std::string rm = "rm -rf '" + to_remove + "'";
+      if (system(rm.c_str()) != 0) {
+      }
+    });
+    return d;
+  }();
+  return dir + "/" + name;
 }
 
 inline Bytes ReadFile(const std::string& path) {

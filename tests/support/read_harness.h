@@ -1,11 +1,8 @@
-// Test helpers for the read path: a per-process scratch directory, a capture
-// of logged messages, and a source spoke driven the way the engine drives it
-// (factory, options, SetUserInfo, MakeFields, GetRecord until 1,
-// ConnectionClose, DeleteFromDbase).
+// Test helpers for the read path: scratch files, a capture of logged
+// messages, a table opened with dbopen, and a source spoke driven the way the
+// engine drives it (factory, options, SetUserInfo, MakeFields, GetRecord
+// until 1, ConnectionClose, DeleteFromDbase).
 #pragma once
-
-#include <sys/stat.h>
-#include <unistd.h>
 
 #include <cstdio>
 #include <cstdlib>
@@ -14,27 +11,10 @@
 
 #include "connector/frdbase.h"
 #include "host/zqutil.h"
+#include "table/dbf.h"
 #include "tests/support/dbf_builder.h"
 
 namespace tests {
-
-// A path in a directory of this process alone: the test programs (and the
-// sanitizer build) run side by side, and each would otherwise overwrite the
-// others' files. The directory goes when the process ends.
-inline std::string ScratchPath(const std::string& name) {
-  static const std::string dir = [] {
-    std::string d = "/tmp/zqdbse-read-" + std::to_string(getpid());
-    mkdir(d.c_str(), 0700);
-    static std::string to_remove = d;
-    atexit([] {
-      std::string rm = "rm -rf '" + to_remove + "'";
-      if (system(rm.c_str()) != 0) {
-      }
-    });
-    return d;
-  }();
-  return dir + "/" + name;
-}
 
 inline std::string WriteScratch(const std::string& name, const Bytes& bytes) {
   std::string path = ScratchPath(name);
@@ -44,6 +24,28 @@ inline std::string WriteScratch(const std::string& name, const Bytes& bytes) {
   fclose(f);
   return path;
 }
+
+// A table opened read-only with dbopen, and its descriptors; closed when it
+// goes unless Close came first.
+struct OpenedTable {
+  ZQDBFIELD* fields[kMaxFields] = {};
+  ZQDBFILE* db = nullptr;
+  int version;  // the caller's dialect, as dbopen leaves it
+
+  OpenedTable(const std::string& path, int dialect) : version(dialect) {
+    db = dbopen(nullptr, path.c_str(), fields, &version, false);
+  }
+  ~OpenedTable() {
+    if (db != nullptr) dbclose(fields, db);
+  }
+  OpenedTable(const OpenedTable&) = delete;
+  OpenedTable& operator=(const OpenedTable&) = delete;
+  int Close() {
+    int rc = dbclose(fields, db);
+    db = nullptr;
+    return rc;
+  }
+};
 
 // Collects what the host's log sink receives while the object lives.
 class LogCapture {

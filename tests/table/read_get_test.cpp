@@ -13,22 +13,7 @@ namespace {
 using tests::Bytes;
 using tests::DbfBuilder;
 
-struct Opened {
-  ZQDBFIELD* fields[kMaxFields] = {};
-  ZQDBFILE* db = nullptr;
-  int version;
-  Opened(const std::string& path, int dialect) : version(dialect) {
-    db = dbopen(nullptr, path.c_str(), fields, &version, false);
-  }
-  int Close() {
-    int rc = dbclose(fields, db);
-    db = nullptr;
-    return rc;
-  }
-  ~Opened() {
-    if (db != nullptr) dbclose(fields, db);
-  }
-};
+using Opened = tests::OpenedTable;
 
 // Three records of "ID" C3 and "N" N2: live, deleted, live.
 Bytes ThreeRecords() {

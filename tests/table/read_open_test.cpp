@@ -12,21 +12,7 @@ namespace {
 using tests::Bytes;
 using tests::DbfBuilder;
 
-// An open table and its descriptors; closed when it goes.
-struct Opened {
-  ZQDBFIELD* fields[kMaxFields] = {};
-  ZQDBFILE* db = nullptr;
-  int version = 0;
-
-  Opened(const std::string& path, int dialect) : version(dialect) {
-    db = dbopen(nullptr, path.c_str(), fields, &version, false);
-  }
-  ~Opened() {
-    if (db != nullptr) dbclose(fields, db);
-  }
-  Opened(const Opened&) = delete;
-  Opened& operator=(const Opened&) = delete;
-};
+using Opened = tests::OpenedTable;
 
 bool IsNarrow(int dialect) { return dialect == 0 || dialect == 3; }
 

@@ -3,6 +3,7 @@
 
 #include <cstdint>
 
+#include "connector/export.h"
 #include "host/zqfield.h"
 #include "host/zqhash.h"
 #include "host/zqspoke.h"
@@ -16,7 +17,7 @@ class ZQToDbase;
 
 // The connector's option block: dialect, memo policy, selected index, and
 // the two type lists of the dialect.
-class ZQDbaseOptions : public ZQSpokeOptions {
+class ZQ_EXPORT ZQDbaseOptions : public ZQSpokeOptions {
  public:
   ZQDbaseOptions(ZQSpoke* spoke, int version);
   ZQDbaseOptions(const ZQDbaseOptions&) = delete;
@@ -56,7 +57,7 @@ extern const VersionName VersionNames[];
 
 // The table object: owns the open table, decodes records, and is the option
 // block the host reaches through GetOptions.
-class ZQDbase : public ZQDbaseOptions {
+class ZQ_EXPORT ZQDbase : public ZQDbaseOptions {
  public:
   static constexpr int memoptrlen = 10;
 

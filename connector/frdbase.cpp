@@ -1,6 +1,13 @@
 #include "connector/frdbase.h"
 
+#include <unistd.h>
+
+#include <cctype>
+#include <cstdio>
 #include <new>
+#include <string>
+
+#include "table/memo.h"
 
 ZQFromDbase::ZQFromDbase(const ZQSpokeDef& def) : ZQImport(def, ZQDbase::GetModifiedTypedefs(), false) {}
 
@@ -76,3 +83,59 @@ BATCHERR ZQFromDbase::GetRecord(int32_t n) { return dbase.GetRecord(*GetLayout(0
 ZQFromDbase* NewFromDbase(const ZQSpokeDef& def) { return new (std::nothrow) ZQFromDbase(def); }
 
 void DeleteFromDbase(ZQFromDbase* spoke) { delete spoke; }
+
+namespace {
+
+void Line(ZQString& text, const char* name, const char* value) {
+  text += name;
+  text += ": ";
+  text += value;
+  text += "\n";
+}
+
+}  // namespace
+
+void ZQFromDbase::ReportFacts(ZQString& text) const {
+  const ZQDBFILE* t = dbase.Table;
+  if (t == nullptr) return;
+  char buf[4400];
+  snprintf(buf, sizeof buf, "0x%02X", unsigned(t->filever));
+  Line(text, "version", buf);
+  snprintf(buf, sizeof buf, "%ld", static_cast<long>(TableCount(t)));
+  Line(text, "records", buf);
+  snprintf(buf, sizeof buf, "%u", unsigned(t->hdrlen));
+  Line(text, "header", buf);
+  snprintf(buf, sizeof buf, "%u", unsigned(t->reclen));
+  Line(text, "record", buf);
+  if (t->hasmemo) {
+    const char* kind = "?";
+    const char* ext = "dbt";
+    switch (t->memokind) {
+      case MEMO_DB3: kind = "dBASE III"; break;
+      case MEMO_DB4: kind = "dBASE IV"; break;
+      case MEMO_DB4FREE: kind = "dBASE IV, with a free-block chain"; break;
+      case MEMO_FPT: kind = "FoxPro", ext = "fpt"; break;
+      case MEMO_SMT: kind = "Clipper SMT", ext = "smt"; break;
+    }
+    char name[4200];
+    std::string path = target_.path.c_str();
+    std::string upper = ext;
+    for (char& c : upper) c = char(toupper(static_cast<unsigned char>(c)));
+    if (!memopath(path.c_str(), ext, name, sizeof name) || access(name, F_OK) != 0)
+      memopath(path.c_str(), upper.c_str(), name, sizeof name);
+    if (t->memofailed)
+      snprintf(buf, sizeof buf, "%s (%s) could not be opened or was refused", name, kind);
+    else
+      snprintf(buf, sizeof buf, "%s (%s, blocks of %u bytes%s)", name, kind, unsigned(t->memoblksize),
+               t->memooff ? ", memos switched off in its header" : "");
+    Line(text, "memo", buf);
+  } else {
+    Line(text, "memo", "none");
+  }
+  for (int i = 0; i < t->fieldcount; ++i) {
+    const ZQDBFIELD* f = dbase.FieldList[i];
+    snprintf(buf, sizeof buf, "%s\t%c\t%u\t%u", f->name, f->type > ' ' ? f->type : '?', unsigned(f->length),
+             unsigned(f->decimals));
+    Line(text, "field", buf);
+  }
+}

@@ -4,7 +4,7 @@
 #include "connector/dbase.h"
 #include "host/zqspoke.h"
 
-class ZQFromDbase : public ZQImport {
+class ZQ_EXPORT ZQFromDbase : public ZQImport {
  public:
   explicit ZQFromDbase(const ZQSpokeDef& def);
   ~ZQFromDbase() override;
@@ -32,6 +32,8 @@ class ZQFromDbase : public ZQImport {
   int RecordSeekGrade() override { return 9; }
   BATCHERR MakeFields() override;
   BATCHERR GetRecord(int32_t n) override;
+  // Version byte, header count and lengths, memo file, field descriptors.
+  void ReportFacts(ZQString& text) const override;
 
   // Read-only views for reports (`zqdb info`) and tests.
   const ZQDBFILE* TableHandle() const { return dbase.Table; }
@@ -42,5 +44,5 @@ class ZQFromDbase : public ZQImport {
 };
 
 // Exported factories.
-extern "C++" ZQFromDbase* NewFromDbase(const ZQSpokeDef& def);
-extern "C++" void DeleteFromDbase(ZQFromDbase* spoke);
+extern "C" ZQ_EXPORT ZQFromDbase* NewFromDbase(const ZQSpokeDef& def);
+extern "C" ZQ_EXPORT void DeleteFromDbase(ZQFromDbase* spoke);

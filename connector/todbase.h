@@ -9,7 +9,7 @@
 #include "connector/dbase.h"
 #include "host/zqspoke.h"
 
-class ZQToDbase : public ZQExport {
+class ZQ_EXPORT ZQToDbase : public ZQExport {
  public:
   explicit ZQToDbase(const ZQSpokeDef& def);
   ~ZQToDbase() override;
@@ -48,6 +48,7 @@ class ZQToDbase : public ZQExport {
   // The number of fields a new table of the current dialect keeps; fields of
   // a layout behind it don't reach the table.
   int CreateFieldCap() const;
+  int MaxNewFieldCount() override { return CreateFieldCap(); }
   // Read-only view for reports and tests.
   const ZQDBFILE* TableHandle() const { return dbase.Table; }
   int32_t Position() const { return CurrentRecord; }
@@ -71,5 +72,5 @@ class ZQToDbase : public ZQExport {
   ZQString FieldScratch;
 };
 
-ZQToDbase* NewToDbase(const ZQSpokeDef& def);
-void DeleteToDbase(ZQToDbase* spoke);
+extern "C" ZQ_EXPORT ZQToDbase* NewToDbase(const ZQSpokeDef& def);
+extern "C" ZQ_EXPORT void DeleteToDbase(ZQToDbase* spoke);

@@ -12,12 +12,11 @@
 
 #include "engine/convert.h"
 #include "engine/dbf_source.h"
-#include "engine/dbfpeek.h"
+#include "engine/modules.h"
 #include "engine/outbuf.h"
 #include "engine/writers.h"
 #include "host/zqglob.h"
 #include "host/zqutil.h"
-#include "table/memo.h"
 
 namespace {
 
@@ -31,9 +30,12 @@ const char kUsage[] =
     "  info TABLE               dialect, version byte, record counts and fields\n"
     "  cat TABLE                the live records (--format csv|jsonl|table)\n"
     "  convert SRC DST          records from a table or CSV file to a table, CSV or JSON-lines file\n"
+    "  formats                  the connector definitions of the modules found\n"
     "\n"
     "options (before or after the file names):\n"
     "  --dialect D              0-10 or a name: \"dBASE IV\", foxpro, clipper, ...\n"
+    "  --type NAME              a connector definition by short name (zqdb formats): dbase, foxpro, clipper, ...\n"
+    "  --modules DIR[:DIR]      where to look for connector modules first (also ZQDB_MODULE_PATH)\n"
     "  --codepage N             the table's code page (437, 850, 1252, ...); 0 = bytes as they are\n"
     "  --memo never|errors|always   when to ignore the memo file (default never)\n"
     "  --format csv|jsonl|table output of cat (default csv)\n"
@@ -88,9 +90,12 @@ int ParseArgs(int argc, char** argv, Args* args) {
       exit(0);
     } else if (a == "--dialect") {
       if (!take(&args->source.dialect) || args->source.dialect.empty()) return Usage("--dialect needs a value");
-      SourcePtr probe(NewFromDbase(ZQSpokeDef{}));
-      if (!probe || !ApplyDialect(probe.get(), args->source.dialect))
-        return Usage("unknown dialect: " + args->source.dialect);
+    } else if (a == "--type") {
+      if (!take(&args->source.type) || args->source.type.empty()) return Usage("--type needs a value");
+    } else if (a == "--modules") {
+      std::string v;
+      if (!take(&v) || v.empty()) return Usage("--modules needs a directory");
+      SetModulePath(v);
     } else if (a == "--codepage") {
       std::string v;
       if (!take(&v)) return Usage("--codepage needs a value");
@@ -112,8 +117,6 @@ int ParseArgs(int argc, char** argv, Args* args) {
       if (!ParseFormat(v, &args->format)) return Usage("--format takes csv, jsonl or table, not " + v);
     } else if (a == "--to") {
       if (!take(&args->convert.to) || args->convert.to.empty()) return Usage("--to needs a value");
-      SourcePtr probe(NewFromDbase(ZQSpokeDef{}));
-      if (!probe || !ApplyDialect(probe.get(), args->convert.to)) return Usage("unknown dialect: " + args->convert.to);
     } else if (a == "--mode") {
       std::string v;
       if (!take(&v)) return Usage("--mode needs a value");
@@ -165,70 +168,87 @@ const char* DialectName(int dialect) {
   return dialect >= 0 && dialect <= 10 ? kNames[dialect] : "?";
 }
 
-// The memo file line of `info`: its name, kind and block size.
-void PrintMemo(const std::string& path, ZQFromDbase* spoke) {
-  const ZQDBFILE* t = spoke->TableHandle();
-  if (t == nullptr || !t->hasmemo) {
-    printf("memo:        none\n");
-    return;
+// The facts a spoke reports, as name and value.
+std::vector<std::pair<std::string, std::string>> Facts(const ZQSpoke* spoke) {
+  ZQString text;
+  spoke->ReportFacts(text);
+  std::vector<std::pair<std::string, std::string>> facts;
+  std::string all(text.c_str(), size_t(text.length()));
+  size_t start = 0;
+  while (start < all.size()) {
+    size_t nl = all.find('\n', start);
+    std::string line = all.substr(start, nl == std::string::npos ? std::string::npos : nl - start);
+    size_t colon = line.find(": ");
+    if (colon != std::string::npos) facts.emplace_back(line.substr(0, colon), line.substr(colon + 2));
+    if (nl == std::string::npos) break;
+    start = nl + 1;
   }
-  const char* kind = "?";
-  const char* ext = "dbt";
-  switch (t->memokind) {
-    case MEMO_DB3: kind = "dBASE III"; break;
-    case MEMO_DB4: kind = "dBASE IV"; break;
-    case MEMO_DB4FREE: kind = "dBASE IV, with a free-block chain"; break;
-    case MEMO_FPT: kind = "FoxPro", ext = "fpt"; break;
-    case MEMO_SMT: kind = "Clipper SMT", ext = "smt"; break;
-  }
-  char name[4200];
-  std::string upper = ext;
-  for (char& c : upper) c = char(toupper(static_cast<unsigned char>(c)));
-  if (!memopath(path.c_str(), ext, name, sizeof name) || access(name, F_OK) != 0)
-    memopath(path.c_str(), upper.c_str(), name, sizeof name);
-  if (t->memofailed)
-    printf("memo:        %s (%s) could not be opened or was refused\n", name, kind);
-  else
-    printf("memo:        %s (%s, blocks of %u bytes%s)\n", name, kind, unsigned(t->memoblksize),
-           t->memooff ? ", memos switched off in its header" : "");
+  return facts;
 }
 
 int CmdInfo(const Args& args) {
   if (args.files.size() != 1) return Usage("info takes one table");
   SourcePtr spoke;
   if (int rc = OpenOrFail(args, &spoke)) return rc;
-  TableFacts facts;
-  PeekTable(args.files[0], &facts);
+  auto facts = Facts(spoke.get());
+  auto fact = [&](const char* name) {
+    for (const auto& f : facts)
+      if (f.first == name) return f.second;
+    return std::string("?");
+  };
+  std::vector<std::string> descriptors;
+  for (const auto& f : facts)
+    if (f.first == "field") descriptors.push_back(f.second);
   ZQString dialect;
   spoke->GetOption("version", dialect);
   int d = atoi(dialect.c_str());
-  int64_t header_count = spoke->EstimateRecordCount();
   int64_t live = 0;
   BATCHERR rc;
   while ((rc = spoke->GetRecord(int32_t(live))) == 0) ++live;
   if (rc != ZQ_END) return Fail(spoke->LastErrorMessage());
   printf("table:       %s\n", args.files[0].c_str());
   printf("dialect:     %d (%s)\n", d, DialectName(d));
-  printf("version:     0x%02X\n", facts.version);
-  printf("records:     %lld in the header, %lld live\n", static_cast<long long>(header_count),
-         static_cast<long long>(live));
-  printf("layout:      header %u bytes, record %u bytes\n", facts.header_length, facts.record_length);
-  PrintMemo(args.files[0], spoke.get());
+  printf("version:     %s\n", fact("version").c_str());
+  printf("records:     %s in the header, %lld live\n", fact("records").c_str(), static_cast<long long>(live));
+  printf("layout:      header %s bytes, record %s bytes\n", fact("header").c_str(), fact("record").c_str());
+  printf("memo:        %s\n", fact("memo").c_str());
   ZQRecord* layout = spoke->GetLayout(0);
   printf("fields:      %d\n", layout->FieldCount());
   printf("  %-4s %-11s %-4s %5s %4s\n", "#", "name", "type", "width", "dec");
   for (int i = 0; i < layout->FieldCount(); ++i) {
     const ZQField* f = (*layout)[i];
-    char type = '?';
-    int width = f->Length(), dec = f->DecLen();
-    if (size_t(i) < facts.fields.size()) {
-      type = facts.fields[size_t(i)].type;
-      width = facts.fields[size_t(i)].length;
-      dec = facts.fields[size_t(i)].decimals;
+    std::string type = "?", width = std::to_string(f->Length()), dec = std::to_string(f->DecLen());
+    if (size_t(i) < descriptors.size()) {
+      // name, letter, width, decimals, separated by tabs
+      const std::string& x = descriptors[size_t(i)];
+      size_t a = x.rfind('\t');
+      size_t b = a == std::string::npos ? a : x.rfind('\t', a - 1);
+      size_t c = b == std::string::npos || b == 0 ? std::string::npos : x.rfind('\t', b - 1);
+      if (c != std::string::npos) {
+        type = x.substr(c + 1, b - c - 1);
+        width = x.substr(b + 1, a - b - 1);
+        dec = x.substr(a + 1);
+      }
     }
-    printf("  %-4d %-11s %-4c %5d %4d\n", i + 1, f->Name(), type, width, dec);
+    printf("  %-4d %-11s %-4s %5s %4s\n", i + 1, f->Name(), type.c_str(), width.c_str(), dec.c_str());
   }
   spoke->ConnectionClose();
+  return 0;
+}
+
+int CmdFormats(const Args& args) {
+  if (!args.files.empty()) return Usage("formats takes no file");
+  ModuleRegistry& r = ModuleRegistry::Get();
+  for (const std::string& w : r.Warnings()) fprintf(stderr, "zqdb: warning: %s\n", w.c_str());
+  if (r.Definitions().empty()) {
+    std::string dirs;
+    for (const std::string& d : ModuleRegistry::SearchPath()) dirs += " " + d;
+    return Fail("no connector module found; looked in" + dirs);
+  }
+  printf("%-11s %-21s %-9s %-11s %s\n", "key", "name", "type", "options", "module");
+  for (const ConnectorDef& d : r.Definitions())
+    printf("%-11s %-21s %-9s %-11s %s\n", d.key.c_str(), d.display.c_str(), d.short_name.c_str(),
+           d.option_text.empty() ? "-" : d.option_text.c_str(), d.file.c_str());
   return 0;
 }
 
@@ -273,6 +293,25 @@ int ZqdbMain(int argc, char** argv) {
   SetLogSink(QuietSink, nullptr);
   Args args;
   if (int rc = ParseArgs(argc, argv, &args)) return rc;
+  // Warnings of the module scan, once, for the commands that use a module.
+  if (args.command != "formats")
+    for (const std::string& w : ModuleRegistry::Get().Warnings()) fprintf(stderr, "zqdb: warning: %s\n", w.c_str());
+  if (args.command == "formats") return CmdFormats(args);
+  // Dialect names are checked before any file is touched: a wrong one is a
+  // usage error.
+  if (!args.source.dialect.empty() || !args.convert.to.empty()) {
+    TableConnector c;
+    std::string error;
+    if (!ResolveConnector(args.source.type, &c, &error)) return Fail(error);
+    for (const std::string* v : {&args.source.dialect, &args.convert.to}) {
+      SourcePtr probe = NewTableSource(c);
+      if (!v->empty() && (!probe || !ApplyDialect(probe.get(), *v))) return Usage("unknown dialect: " + *v);
+    }
+  } else if (!args.source.type.empty()) {
+    TableConnector c;
+    std::string error;
+    if (!ResolveConnector(args.source.type, &c, &error)) return Usage(error);
+  }
   if (args.command == "info") return CmdInfo(args);
   if (args.command == "cat") return CmdCat(args);
   if (args.command == "convert") return CmdConvert(args);

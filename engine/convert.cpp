@@ -13,7 +13,6 @@
 #include <unordered_map>
 #include <vector>
 
-#include "connector/todbase.h"
 #include "engine/csv_source.h"
 #include "engine/text_target.h"
 #include "engine/text_types.h"
@@ -220,27 +219,17 @@ void KeyOf(ZQRecord& record, const std::vector<int>& key, std::string* out) {
   }
 }
 
-struct ImportDeleter {
-  void operator()(ZQImport* s) const {
-    if (auto* d = dynamic_cast<ZQFromDbase*>(s)) DeleteFromDbase(d);
-    else delete s;
-  }
-};
-struct ExportDeleter {
-  void operator()(ZQExport* s) const {
-    if (auto* d = dynamic_cast<ZQToDbase*>(s)) DeleteToDbase(d);
-    else delete s;
-  }
-};
+void DeleteImport(ZQImport* s) { delete s; }
+void DeleteExport(ZQExport* s) { delete s; }
 
 }  // namespace
 
 int RunConvert(const std::string& src, const std::string& dst, const ConvertOptions& opts) {
   // Source.
-  std::unique_ptr<ZQImport, ImportDeleter> source;
+  SourcePtr source;
   bool csv_source = EndsWith(src, ".csv");
   if (csv_source) {
-    auto csv = std::unique_ptr<ZQImport, ImportDeleter>(new ZQFromCsv());
+    SourcePtr csv(new ZQFromCsv(), SourceDeleter{DeleteImport});
     if (!opts.schema.empty()) {
       std::vector<SchemaField> schema;
       std::string error;
@@ -253,22 +242,34 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
     if (csv->MakeFields() != 0) return Fail(csv->LastErrorMessage());
     source = std::move(csv);
   } else {
-    SourcePtr dbf;
     std::string error;
-    if (OpenSource(src, opts.source, &dbf, &error) != 0) return Fail(error);
-    source.reset(dbf.release());
+    if (OpenSource(src, opts.source, &source, &error) != 0) return Fail(error);
   }
   ZQRecord& in = *source->GetLayout(0);
 
   // Target.
-  std::unique_ptr<ZQExport, ExportDeleter> target;
+  TargetPtr target;
   bool dbf_target = true;
-  if (EndsWith(dst, ".csv")) target.reset(new ZQToText(OutputFormat::kCsv)), dbf_target = false;
-  else if (EndsWith(dst, ".jsonl") || EndsWith(dst, ".json")) target.reset(new ZQToText(OutputFormat::kJsonl)), dbf_target = false;
-  else target.reset(NewToDbase(ZQSpokeDef{}));
+  TableConnector connector;
+  if (EndsWith(dst, ".csv")) {
+    target = TargetPtr(new ZQToText(OutputFormat::kCsv), TargetDeleter{DeleteExport});
+    dbf_target = false;
+  } else if (EndsWith(dst, ".jsonl") || EndsWith(dst, ".json")) {
+    target = TargetPtr(new ZQToText(OutputFormat::kJsonl), TargetDeleter{DeleteExport});
+    dbf_target = false;
+  } else {
+    std::string error;
+    if (!ResolveConnector(opts.source.type, &connector, &error)) return Fail(error);
+    target = NewTableTarget(connector);
+  }
   if (!target) return Fail("out of memory");
   if (dbf_target) {
     std::string dialect = opts.to;
+    if (dialect.empty() && !connector.def->option_text.empty()) {
+      ZQString v;  // the definition named one
+      target->GetOption("version", v);
+      dialect = v.c_str();
+    }
     if (dialect.empty()) {
       ZQString v;
       if (!csv_source && source->GetOption("version", v) == 0) dialect = v.c_str();
@@ -300,8 +301,7 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
     return Fail(message.empty() ? "cannot read the layout of " + dst : message);
   }
   int cap = target->MaxFieldCount();
-  if (auto* d = dynamic_cast<ZQToDbase*>(target.get()); d != nullptr && opts.mode == 0)
-    cap = std::min(cap, d->CreateFieldCap());
+  if (opts.mode == 0 || !existing) cap = std::min(cap, target->MaxNewFieldCount());
   std::vector<std::string> names;
   std::vector<FieldCheck> checks;
   std::vector<int> from;  // source field of each target field

@@ -67,21 +67,65 @@ int GuessDialect(const std::string& path) {
   }
 }
 
+bool ResolveConnector(const std::string& type, TableConnector* out, std::string* error) {
+  ModuleRegistry& r = ModuleRegistry::Get();
+  const ConnectorDef* def = type.empty() ? r.Default() : r.ByShortName(type);
+  if (def == nullptr) {
+    if (!type.empty() && !r.Definitions().empty()) {
+      *error = "no connector definition named " + type + " (zqdb formats lists them)";
+    } else {
+      *error = "no connector module found; looked in";
+      for (const std::string& d : ModuleRegistry::SearchPath()) *error += " " + d;
+    }
+    return false;
+  }
+  if (!r.Load(*def, &out->factories, error)) return false;
+  out->def = def;
+  out->spoke_def.key = def->key.c_str();
+  out->spoke_def.display_name = def->display.c_str();
+  out->spoke_def.short_name = def->short_name.c_str();
+  out->spoke_def.option_text = def->option_text.c_str();
+  return true;
+}
+
+SourcePtr NewTableSource(const TableConnector& c) {
+  SourcePtr p(c.factories.new_source(c.spoke_def), SourceDeleter{c.factories.delete_source});
+  if (p) ApplyOptionText(p.get(), c.def->option_text);
+  return p;
+}
+
+TargetPtr NewTableTarget(const TableConnector& c) {
+  TargetPtr p(c.factories.new_target(c.spoke_def), TargetDeleter{c.factories.delete_target});
+  if (p) ApplyOptionText(p.get(), c.def->option_text);
+  return p;
+}
+
+void ApplyOptionText(ZQSpoke* spoke, const std::string& text) {
+  size_t eq = text.find('=');
+  if (eq == std::string::npos) return;
+  spoke->SetOption(text.substr(0, eq).c_str(), text.substr(eq + 1).c_str());
+}
+
 BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePtr* out, std::string* error) {
-  SourcePtr spoke(NewFromDbase(ZQSpokeDef{}));
+  TableConnector c;
+  if (!ResolveConnector(opts.type, &c, error)) return ZQ_OPEN_ERROR;
+  SourcePtr spoke = NewTableSource(c);
   if (!spoke) {
     *error = "out of memory";
     return ZQ_NO_MEMORY;
   }
-  if (opts.dialect.empty()) {
-    // No dialect named: take the one the version byte points to, so that
-    // any table reads without the user knowing its dialect.
+  if (!opts.dialect.empty()) {
+    if (!ApplyDialect(spoke.get(), opts.dialect)) {
+      *error = "unknown dialect: " + opts.dialect;
+      return ZQ_BAD_OPTIONS;
+    }
+  } else if (c.def->option_text.empty()) {
+    // Neither a dialect nor a definition that names one: take the dialect
+    // the version byte points to, so that any table reads without the user
+    // knowing its dialect.
     char guess[4];
     snprintf(guess, sizeof guess, "%d", GuessDialect(path));
     spoke->SetOption("version", guess);
-  } else if (!ApplyDialect(spoke.get(), opts.dialect)) {
-    *error = "unknown dialect: " + opts.dialect;
-    return ZQ_BAD_OPTIONS;
   }
   char buf[16];
   snprintf(buf, sizeof buf, "%d", opts.codepage);

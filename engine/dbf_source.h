@@ -1,23 +1,50 @@
-// Opens a table as a source spoke, the way the integration engine does: the
-// factory, the options through their definitions, SetUserInfo, MakeFields;
-// then records by number until the spoke says 1.
+// Tables as spokes: the connector definition is picked (--type, or the
+// default one), its module loaded, and the spoke made by its factories; the
+// definition's option text and the options are applied through the option
+// definitions, as the integration engine applies them.
 #pragma once
 
 #include <memory>
 #include <string>
 
-#include "connector/frdbase.h"
+#include "engine/modules.h"
+#include "host/zqspoke.h"
 
 struct SourceOptions {
-  std::string dialect;  // number 0-10 or a name the version option accepts; "" keeps 2
+  std::string type;     // a definition's short name; "" for the default
+  std::string dialect;  // number 0-10 or a name the version option accepts; "" = by the file
   int codepage = 0;
   int memo_policy = 0;  // 0 never, 1 errors, 2 always ignore the memo file
 };
 
-struct SpokeDeleter {
-  void operator()(ZQFromDbase* s) const { DeleteFromDbase(s); }
+struct SourceDeleter {
+  void (*del)(ZQImport*) = nullptr;
+  void operator()(ZQImport* s) const {
+    if (s != nullptr) del(s);
+  }
 };
-using SourcePtr = std::unique_ptr<ZQFromDbase, SpokeDeleter>;
+struct TargetDeleter {
+  void (*del)(ZQExport*) = nullptr;
+  void operator()(ZQExport* s) const {
+    if (s != nullptr) del(s);
+  }
+};
+using SourcePtr = std::unique_ptr<ZQImport, SourceDeleter>;
+using TargetPtr = std::unique_ptr<ZQExport, TargetDeleter>;
+
+// A definition and its loaded factories.
+struct TableConnector {
+  const ConnectorDef* def = nullptr;
+  SpokeFactories factories;
+  ZQSpokeDef spoke_def;
+};
+
+// Finds the definition by short name (or the default) and loads its module.
+bool ResolveConnector(const std::string& type, TableConnector* out, std::string* error);
+SourcePtr NewTableSource(const TableConnector& c);
+TargetPtr NewTableTarget(const TableConnector& c);
+// Applies a definition's option text ("name=value", or empty) to a spoke.
+void ApplyOptionText(ZQSpoke* spoke, const std::string& text);
 
 // Resolves a --dialect value against the version option of `spoke` and sets
 // it. False when the value names no dialect.

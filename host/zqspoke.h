@@ -215,6 +215,10 @@ class ZQSpoke {
   virtual ZQSpokeOptions* GetOptions() const { return nullptr; }
   virtual void SaveOptions(ZQString& text) const;
   virtual ZQRecord* GetIndexFields() { return GetLayout(0); }
+  // This engine's own addition: "name: value" lines of facts about the open
+  // connection (file format, counts, companion files) for reports. Nothing by
+  // default.
+  virtual void ReportFacts(ZQString& text) const { (void)text; }
 
   ZQRecord* GetLayout(int n) const;
   const ZQDType& TypeByUsage(int16_t usage) const;
@@ -302,4 +306,7 @@ class ZQExport : public ZQSpoke {
   virtual BATCHERR SetFilePosition(int64_t position);
   virtual void FieldNameCharSet(ZQString& first, ZQString& second);
   virtual BATCHERR ValidateLocalRecord(const ZQRecord& record, int& field);
+  // This engine's own addition: how many fields a new target keeps; fields of
+  // a longer layout don't reach it. MaxFieldCount() by default.
+  virtual int MaxNewFieldCount() { return MaxFieldCount(); }
 };

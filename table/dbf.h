@@ -48,6 +48,7 @@
 
 #include <cstdint>
 
+#include "connector/export.h"
 #include "host/zqfile.h"
 #include "host/zqstring.h"
 
@@ -164,11 +165,11 @@ void dbname(const char* src, char* dst);
 // bits are the dialect). Names are NUL-padded to 11 bytes in place.
 // `production` fills byte 28 of the wide header. 0, or -1; nothing is
 // cleaned up on failure.
-int dbcreat(const char* name, int count, ZQDBFIELD** fields, int version, bool production);
+extern "C" ZQ_EXPORT int dbcreat(const char* name, int count, ZQDBFIELD** fields, int version, bool production);
 // Writes physical record `number` (from 0; the count appends) from `record`
 // (reclen - 1 bytes) with flag 0x20 if `live`, else 0x2A. 0, or -1 (a number
 // above the count, a count the header can't hold, or a failed write).
-int dbput(ZQDBFILE* db, const char* record, int32_t number, int live);
+extern "C" ZQ_EXPORT int dbput(ZQDBFILE* db, const char* record, int32_t number, int live);
 // Removes the table `name` and, if `hasmemo`, its memo file of `memokind`.
 // 0, or -1 when a file could not be removed.
 int dbdelete(const char* name, bool hasmemo, char memokind);

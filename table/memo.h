@@ -7,13 +7,14 @@
 #include <cstddef>
 #include <cstdint>
 
+#include "connector/export.h"
 #include "host/zqfield.h"
 #include "host/zqstring.h"
 #include "table/dbf.h"
 
 // A memo pointer that travels with a field from a read record to the update
 // of that record. The field that holds it owns it.
-class ZQMemoBlockNumber : public ZQFieldInfo {
+class ZQ_EXPORT ZQMemoBlockNumber : public ZQFieldInfo {
  public:
   static constexpr int string_length = 10;
   static constexpr const char* format_str = "%010ld";
@@ -42,15 +43,15 @@ class ZQMemoBlockNumber : public ZQFieldInfo {
 // holds the block number as "%10ld" text), a block outside the file, a
 // stored length that runs past the end of the file (then `text` holds the
 // bytes up to the end), or, with `memostat` 0, a block that holds no text.
-bool getmemo(ZQDBFILE* file, uint32_t block, uint32_t length, ZQString& text);
+extern "C" ZQ_EXPORT bool getmemo(ZQDBFILE* file, uint32_t block, uint32_t length, ZQString& text);
 
 // Stores `text` (never empty), replacing the memo at `oldblock` unless that
 // is 0. The block number the record must now hold (`oldblock` when the memo
 // stayed), or 0 on failure.
-uint32_t putmemo(ZQDBFILE* file, uint32_t oldblock, const ZQString& text);
+extern "C" ZQ_EXPORT uint32_t putmemo(ZQDBFILE* file, uint32_t oldblock, const ZQString& text);
 // Gives up the memo at `block`, `blocks` blocks long (old length / block
 // size + 1). 0, or -1 on a failed seek or write.
-int deloldm(ZQDBFILE* file, uint32_t block, int blocks);
+extern "C" ZQ_EXPORT int deloldm(ZQDBFILE* file, uint32_t block, int blocks);
 
 // Places a memo: at `block`, or, for block 0, where the header (or the free
 // chain's last entry) says, moving that on. The block used, or 0.

@@ -9,9 +9,9 @@ JOBS       ?= $(shell nproc 2>/dev/null || echo 2)
 
 # What each package is for: see README.md, "Dependencies".
 PACKAGES = cmake ninja-build g++ clang libclang-rt-14-dev libgtest-dev python3 \
-           python3-dbfread python3-dbf libdbd-xbase-perl shapelib gdal-bin pgdbf
+           python3-dbfread python3-dbf libdbd-xbase-perl shapelib gdal-bin pgdbf dpkg-dev
 
-.PHONY: all setup build demo test test-unit test-sanitize bench clean
+.PHONY: all setup build demo test test-sanitize bench package clean
 
 all: build
 
@@ -53,5 +53,13 @@ test-sanitize: setup
 bench: build
 	bench/run.sh $(BUILD)/zqdb
 
+# A Debian package of zqdb, the module and the headers, for /usr.
+PKG_BUILD ?= build-pkg
+package: setup
+	cmake -S . -B $(PKG_BUILD) -G Ninja -DCMAKE_BUILD_TYPE=RelWithDebInfo -DCMAKE_INSTALL_PREFIX=/usr >/dev/null
+	ninja -C $(PKG_BUILD) -j $(JOBS) zqdb zqdbse zqhost
+	cd $(PKG_BUILD) && cpack -G DEB
+	@ls $(PKG_BUILD)/*.deb
+
 clean:
-	rm -rf $(BUILD) $(SAN_BUILD)
+	rm -rf $(BUILD) $(SAN_BUILD) $(PKG_BUILD)

@@ -1,0 +1,41 @@
+#!/bin/bash
+# The engine finds the module by its trailer, in a process of its own: the
+# definitions it lists, a conversion through a definition picked by short
+# name, and a damaged module beside it skipped with one warning.
+source "$(dirname "$0")/lib.bash" "$1"
+
+# anywhere in stderr, not only its first line
+expect_err_any() {
+  if grep -qF -- "$1" "$ERR"; then PASSED=$((PASSED + 1)); else fail "stderr lacks '$1': $(head -c 300 "$ERR")"; fi
+}
+
+expect_run 0 formats && expect_out "DADBASE     dBASE IV" && expect_out "DAVFOXPRO   Visual FoxPro" &&
+  expect_out "clipper   version=8" && expect_out "libzqdbse.so"
+
+# A conversion through the FoxPro definition: the new table is a FoxPro one.
+printf 'NAME,NOTE\nann,%s\n' "$(head -c 300 /dev/zero | tr '\0' 'x')" >"$WORK/in.csv"
+expect_run 0 convert "$WORK/in.csv" "$WORK/fox.dbf" --type foxpro --no-progress
+expect_run 0 info "$WORK/fox.dbf" && expect_out "dialect:     6 (FoxPro)" && expect_out "version:     0xF5" &&
+  expect_out "fox.fpt (FoxPro"
+expect_run 0 cat "$WORK/fox.dbf" --type foxpro --format jsonl && expect_out '"NAME":"ann"'
+expect_run 2 cat "$WORK/fox.dbf" --type nosuch && expect_err "no connector definition named nosuch"
+
+# Modules in a directory of our own: a copy of the real one is found there,
+# a damaged one and a text file with a trailer are skipped with a warning.
+mkdir -p "$WORK/mods"
+module=$(dirname "$ZQDB")/libzqdbse.so
+cp "$module" "$WORK/mods/libgood.so"
+head -c 2000 "$module" >"$WORK/mods/libcut.so"
+tail -c 1212 "$module" >>"$WORK/mods/libcut.so"
+printf '\x00\x00\x00\x00' | dd of="$WORK/mods/libcut.so" bs=1 seek=$(($(stat -c %s "$WORK/mods/libcut.so") - 16)) conv=notrunc 2>/dev/null
+{ head -c 500 /dev/zero; tail -c 1212 "$module"; } >"$WORK/mods/libtext.so"
+ZQDB_MODULE_PATH="$WORK/mods" expect_run 0 formats && expect_out "$WORK/mods/libgood.so" &&
+  expect_err_any "libcut.so is skipped" && expect_err_any "libtext.so is skipped"
+expect_run 0 --modules "$WORK/mods" cat "$WORK/fox.dbf" --format jsonl && expect_out '"NAME":"ann"'
+
+# No module anywhere: a clear error, not a crash.
+mkdir -p "$WORK/lonely"
+cp "$ZQDB" "$WORK/lonely/zqdb"
+out=$(cd "$WORK/lonely" && LD_LIBRARY_PATH=$(dirname "$ZQDB") ./zqdb info "$WORK/fox.dbf" 2>&1); rc=$?
+if [ "$rc" = 1 ] && grep -q "no connector module found" <<<"$out"; then PASSED=$((PASSED + 1)); else fail "no module: exit $rc: $out"; fi
+finish

@@ -7,6 +7,7 @@
 #include <cstring>
 #include <new>
 
+#include "host/bytescan.h"
 #include "host/endian.h"
 #include "host/zqglob.h"
 #include "host/zqutil.h"
@@ -258,19 +259,45 @@ int32_t ZQToDbase::PhysicalForWrite() {
   return -1;
 }
 
+namespace {
+
+// Digits before the point of a plain decimal number text, leading zeros not
+// counted; -1 when the text is no plain decimal number.
+int32_t IntegerDigits(const ZQString& s) {
+  const char* p = s.c_str();
+  int32_t n = s.length(), i = 0;
+  if (i < n && (p[i] == '-' || p[i] == '+')) ++i;
+  while (i < n && p[i] == '0') ++i;
+  int32_t start = i;
+  while (i < n && p[i] >= '0' && p[i] <= '9') ++i;
+  int32_t digits = i - start;
+  if (i < n && p[i] == '.') {
+    ++i;
+    while (i < n && p[i] >= '0' && p[i] <= '9') ++i;
+  }
+  return i == n ? digits : -1;
+}
+
+}  // namespace
+
 void ZQToDbase::EncodeNumber(char* dest, int32_t room, ZQField* field) {
-  double v = field->DoubleVal();
   const ZQDType& t = field->DataType();
   int dialect = dbase.Table->dialect;
   bool plain = dialect == 0 || dialect == 1 || dialect == 4 || dialect == 6 || dialect == 10;
+  double v = 0;
   if (!plain) {
-    double a = std::fabs(v);
-    if (v == 0 || (a > 0.000001 && a < 1)) {
+    int32_t l = t.Length();
+    if (t.DecimalPlaces() != 0) l -= 1 + t.DecimalPlaces();
+    // |v| below 10^l, the common case, is plain whatever else holds; a number
+    // held as text tells that by its digits, without being parsed.
+    int32_t digits = field->held() == ZQField::Held::kText ? IntegerDigits(field->StringRef()) : -1;
+    if (digits >= 0 && digits <= l) {
       plain = true;
     } else {
-      int32_t l = t.Length();
-      if (t.DecimalPlaces() != 0) l -= 1 + t.DecimalPlaces();
-      plain = std::log10(a) < l;
+      v = field->DoubleVal();
+      double a = std::fabs(v);
+      if (v == 0 || (a > 0.000001 && a < 1)) plain = true;
+      else plain = std::log10(a) < l;
     }
   }
   char out[400];
@@ -285,8 +312,13 @@ void ZQToDbase::EncodeNumber(char* dest, int32_t room, ZQField* field) {
       s += n - w;
       n = w;
     }
-    snprintf(out, sizeof out, "%*.*s", int(w), int(n), s);
+    // Right-justified in w bytes, blanks on the left.
+    int32_t take = w < room ? w : room;
+    int32_t lead = w - n;
+    for (int32_t k = 0; k < take; ++k) dest[k] = k < lead ? ' ' : s[k - lead];
+    return;
   } else {
+    v = field->DoubleVal();
     w = t.Length();
     if (w > 255) w = 255;
     int32_t p = t.Precision();
@@ -354,17 +386,28 @@ BATCHERR ZQToDbase::GenerateDetailRecord(int layout_number) {
         break;
       default: {
         width = f->Length();
-        f->RenderText(FieldScratch, 1);
-        if (FieldScratch.length() < width) {
-          char pad = f->DataType().GetPadChar(nullptr);
-          FieldScratch.Pad(pad ? pad : ' ', width - FieldScratch.length());
+        // Text goes in as it is held; other values by their text form.
+        const ZQString* text = &FieldScratch;
+        if (f->held() == ZQField::Held::kText) text = &f->StringRef();
+        else f->RenderText(FieldScratch, 1);
+        // Only text with bytes beyond ASCII changes in a code page (padding
+        // is blanks, which never do).
+        if (dbase.CodePage() != 0 && bytescan::HasHighBit(text->c_str(), size_t(text->length()))) {
+          if (text != &FieldScratch) FieldScratch = *text;
+          ZQGlob::InternalToExternal(dbase.CodePage(), FieldScratch);
+          text = &FieldScratch;
         }
-        if (dbase.CodePage() != 0) ZQGlob::InternalToExternal(dbase.CodePage(), FieldScratch);
-        // The copy stops at a NUL byte of the text; the rest stays zero.
+        // At most the width, cut on the right; the copy stops at a NUL byte
+        // of the text and the rest stays zero; a shorter text is padded.
         int32_t take = width < left ? width : left;
-        if (take > FieldScratch.length()) take = FieldScratch.length();
-        const char* s = FieldScratch.c_str();
-        for (int32_t k = 0; k < take && s[k] != '\0'; ++k) dest[k] = s[k];
+        int32_t n = text->length() < take ? text->length() : take;
+        const char* s = text->c_str();
+        const void* nul = memchr(s, 0, size_t(n));
+        memcpy(dest, s, nul ? size_t(static_cast<const char*>(nul) - s) : size_t(n));
+        if (nul == nullptr && n < take) {
+          char pad = f->DataType().GetPadChar(nullptr);
+          memset(dest + n, pad ? pad : ' ', size_t(take - n));
+        }
         break;
       }
     }

@@ -22,8 +22,8 @@ class CsvReader {
   // Fields stay valid until the next call.
   bool Next();
   size_t FieldCount() const { return ends_.size(); }
-  const char* Field(size_t i) const { return field_data_.data() + (i ? ends_[i - 1] : 0); }
-  size_t FieldLength(size_t i) const { return ends_[i] - (i ? ends_[i - 1] : 0); }
+  const char* Field(size_t i) const { return (base_ ? base_ : field_data_.data()) + starts_[i]; }
+  size_t FieldLength(size_t i) const { return ends_[i] - starts_[i]; }
   std::string FieldString(size_t i) const { return std::string(Field(i), FieldLength(i)); }
   // 1-based line on which the current record starts.
   int64_t Line() const { return record_line_; }
@@ -42,6 +42,12 @@ class CsvReader {
   bool eof_ = false;
   int64_t line_ = 1, record_line_ = 1, consumed_ = 0;
   std::string field_data_;
+  // Where the current record's fields are: in the read buffer itself for a
+  // plain line (no copy), else (NULL) in field_data_. Field i spans
+  // [starts_[i], ends_[i]) from there.
+  const char* base_ = nullptr;
+  std::vector<size_t> starts_;
+  size_t field_start_ = 0;
   std::vector<size_t> ends_;
   std::string error_;
 };

@@ -124,9 +124,8 @@ void CodePageToUtf8(int codepage, ZQString& text) {
 void Utf8ToCodePage(int codepage, ZQString& text) {
   int32_t n = text.length();
   const auto* p = reinterpret_cast<const uint8_t*>(text.c_str());
+  if (!bytescan::HasHighBit(text.c_str(), size_t(n))) return;  // ASCII is the same in every code page here
   int32_t i = 0;
-  while (i < n && p[i] < 0x80) ++i;
-  if (i == n) return;
   const CodePageMap* map = CodePageTable(codepage);
   if (map == nullptr) return;
   static ZQString out;

@@ -1,6 +1,7 @@
 #include "host/zqdate.h"
 
 #include <cstdio>
+#include <cstring>
 #include <ctime>
 
 int32_t JulianDayFromDate(int32_t year, int32_t month, int32_t day) {
@@ -42,8 +43,20 @@ ZQDate::ZQDate() {
 ZQDate::ZQDate(int32_t year, int32_t month, int32_t day) : year_(year), month_(month), day_(day) {}
 
 void ZQDate::Print(ZQString& out, const char* picture) const {
-  out = "";
   if (picture == nullptr) picture = "yyyymmdd";
+  if (year_ == 0 && month_ == 0 && day_ == 0) {  // no date: blanks as wide as the picture
+    out.Set(' ', int32_t(strlen(picture)));
+    return;
+  }
+  if (strcmp(picture, "yyyymmdd") == 0 && year_ >= 0 && year_ <= 9999 && month_ >= 0 && month_ <= 99 &&
+      day_ >= 0 && day_ <= 99) {
+    char b[8] = {char('0' + year_ / 1000),     char('0' + year_ / 100 % 10), char('0' + year_ / 10 % 10),
+                 char('0' + year_ % 10),       char('0' + month_ / 10),      char('0' + month_ % 10),
+                 char('0' + day_ / 10),        char('0' + day_ % 10)};
+    out.CopyN(b, 8, 0);
+    return;
+  }
+  out = "";
   for (const char* p = picture; *p != '\0';) {
     char c = *p;
     int run = 0;

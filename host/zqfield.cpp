@@ -192,6 +192,14 @@ bool FixDecimals(const char* p, int32_t n, int dec, ZQString& out) {
     frac_end = i;
   }
   if (i != n || (int_end == int_start && frac_end == frac_start)) return false;
+  // Already in the form: no plus sign, no leading zero, the decimals wanted.
+  bool has_point = frac_start != int_end;
+  if ((p[0] != '+') && int_end > int_start && (p[int_start] != '0' || int_end - int_start == 1) &&
+      (dec > 0 ? has_point && frac_end - frac_start == dec : !has_point) &&
+      !(neg && int_end - int_start == 1 && p[int_start] == '0')) {
+    out.CopyN(p, n, 0);
+    return true;
+  }
   // Digits: the integer part, then exactly `dec` fraction digits.
   char digits[400];
   int32_t k = 0;

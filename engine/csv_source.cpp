@@ -127,10 +127,10 @@ bool ParseSchema(const std::string& text, std::vector<SchemaField>* out, std::st
       *error = "unknown type in the schema: " + item + " (types: C N F D L M I Y B T)";
       return false;
     }
-    if ((f.letter == 'C' || f.letter == 'N' || f.letter == 'F') && (f.length < 1 || f.length > 255)) {
-      if (f.length == 0 && f.letter == 'C') f.length = kLongestText;
-      else if (f.length == 0) f.length = 20;
-      else {
+    if (f.letter == 'C' || f.letter == 'N' || f.letter == 'F') {
+      if (args.empty()) {
+        f.length = f.letter == 'C' ? kLongestText : 20;  // no width given
+      } else if (f.length < 1 || f.length > 255) {
         *error = "width outside 1 to 255 in the schema: " + item;
         return false;
       }

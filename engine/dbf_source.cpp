@@ -59,6 +59,25 @@ int GuessDialect(const std::string& path) {
   FILE* f = fopen(path.c_str(), "rb");
   int v = f ? fgetc(f) : EOF;
   if (f) fclose(f);
+  if (v >= 0 && (v & 0x8F) == 0x8B) {
+    // dBASE IV's byte with a memo file: Enable OA writes the same byte with
+    // a dBASE III memo file, whose header has no dBASE IV version word.
+    std::string base = path;
+    size_t dot = base.rfind('.');
+    if (dot != std::string::npos && base.find('/', dot) == std::string::npos) base.resize(dot);
+    for (const char* ext : {".dbt", ".DBT"}) {
+      FILE* m = fopen((base + ext).c_str(), "rb");
+      if (m == nullptr) continue;
+      unsigned char h[20], b[4];
+      bool dbase4 = fread(h, 1, sizeof h, m) == sizeof h && h[19] == 0x01 && (h[18] == 0x01 || h[18] == 0x02);
+      // Some writers leave the version word out; their memo blocks still
+      // start as dBASE IV's do (FF FF, then the text offset 8).
+      if (!dbase4 && fseek(m, 512, SEEK_SET) == 0 && fread(b, 1, 4, m) == 4)
+        dbase4 = b[0] == 0xFF && b[1] == 0xFF && b[2] == 0x08 && b[3] == 0x00;
+      fclose(m);
+      return dbase4 ? 2 : 7;
+    }
+  }
   switch (v) {
     case 0x02: return 0;  // dBASE II (Enable's narrow tables read the same)
     case 0xFE: return 3;  // Enable with more than 32 fields

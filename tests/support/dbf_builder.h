@@ -145,19 +145,6 @@ class DbfBuilder {
   std::vector<Bytes> records_;
 };
 
-// Writes bytes to a file under a per-test temporary directory.
-inline std::string WriteTemp(const std::string& name, const Bytes& bytes) {
-  std::string dir = "/tmp/zqdbse-tests";
-  std::string mk = "mkdir -p " + dir;
-  if (system(mk.c_str()) != 0) return "";
-  std::string path = dir + "/" + name;
-  FILE* f = fopen(path.c_str(), "wb");
-  if (f == nullptr) return "";
-  if (!bytes.empty()) fwrite(bytes.data(), 1, bytes.size(), f);
-  fclose(f);
-  return path;
-}
-
 // A path in a directory of this process alone: the test programs (and the
 // sanitizer build) run side by side, and each would otherwise overwrite the
 // others' files. The directory goes when the process ends.
@@ -174,6 +161,16 @@ inline std::string ScratchPath(const std::string& name) {
     return d;
   }();
   return dir + "/" + name;
+}
+
+// Writes bytes to a file in this process's scratch directory.
+inline std::string WriteTemp(const std::string& name, const Bytes& bytes) {
+  std::string path = ScratchPath(name);
+  FILE* f = fopen(path.c_str(), "wb");
+  if (f == nullptr) return "";
+  if (!bytes.empty()) fwrite(bytes.data(), 1, bytes.size(), f);
+  fclose(f);
+  return path;
 }
 
 inline Bytes ReadFile(const std::string& path) {

@@ -95,22 +95,8 @@ class MemoBytes {
   Bytes bytes_;
 };
 
-// A path in a directory of this process alone, removed when it ends: test
-// programs run side by side.
-inline std::string MemoScratch(const std::string& name) {
-  static const std::string dir = [] {
-    std::string d = "/tmp/zqdbse-memo-" + std::to_string(getpid());
-    mkdir(d.c_str(), 0700);
-    static std::string to_remove = d;
-    atexit([] {
-      std::string rm = "rm -rf '" + to_remove + "'";
-      if (system(rm.c_str()) != 0) {
-      }
-    });
-    return d;
-  }();
-  return dir + "/" + name;
-}
+// A path in this process's scratch directory (see dbf_builder.h).
+inline std::string MemoScratch(const std::string& name) { return ScratchPath(name); }
 
 inline std::string WriteAt(const std::string& path, const Bytes& bytes) {
   FILE* f = fopen(path.c_str(), "wb");

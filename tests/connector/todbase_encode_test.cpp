@@ -1,0 +1,314 @@
+// The target spoke writing new tables: number forms by dialect, dates, text
+// and code pages, the field caps and widths of a new table, the type rules,
+// the record length limit, and what a layout that differs from an existing
+// table gets.
+#include <gtest/gtest.h>
+
+#include <string>
+#include <vector>
+
+#include "tests/connector/todbase_harness.h"
+
+namespace {
+
+using tests::Bytes;
+using tests::DbfBuilder;
+using tests::LogCapture;
+using tests::ScratchPath;
+using tests::Target;
+using tests::Written;
+
+// Writes one value into a new table with a single numeric field and gives the
+// field's bytes. A value given as text takes the field's text path; the
+// double overload the parsed path.
+std::string Number(int dialect, int width, int decimals, const char* text) {
+  Target t(dialect);
+  t.Add('N', "N", width, decimals);
+  std::string path = ScratchPath("num.dbf");
+  EXPECT_EQ(t.Open(path), 0);
+  t.Set(0, text);
+  EXPECT_EQ(t.Write(), 0);
+  t.Close();
+  return Written(path).Record(0).substr(1);
+}
+std::string Number(int dialect, int width, int decimals, double value) {
+  Target t(dialect);
+  t.Add('N', "N", width, decimals);
+  std::string path = ScratchPath("num.dbf");
+  EXPECT_EQ(t.Open(path), 0);
+  *t[0] = value;
+  EXPECT_EQ(t.Write(), 0);
+  t.Close();
+  return Written(path).Record(0).substr(1);
+}
+
+TEST(ToDbaseEncodeTest, NumberForms) {
+  // Too wide for N(5): dialect 1 keeps the low digits, dialect 2 goes to the
+  // exponent form, which keeps the magnitude.
+  EXPECT_EQ(Number(1, 5, 0, "123456"), "23456");
+  EXPECT_EQ(Number(1, 5, 0, 123456.0), "23456");
+  EXPECT_EQ(Number(2, 5, 0, "123456"), "1E+05");
+  EXPECT_EQ(Number(2, 5, 0, 123456.0), "1E+05");
+  // A six-character rendering loses its sign, in every dialect.
+  for (int d : {0, 1, 2, 8, 9}) {
+    EXPECT_EQ(Number(d, 5, 0, "-99999"), "99999") << d;
+    EXPECT_EQ(Number(d, 5, 0, -99999.0), "99999") << d;
+  }
+  // The plain form holds while log10 stays below the width.
+  EXPECT_EQ(Number(2, 5, 0, "99999"), "99999");
+  EXPECT_EQ(Number(2, 5, 0, 99999.0), "99999");
+  EXPECT_EQ(Number(2, 5, 0, "100000"), "1E+05");
+  EXPECT_EQ(Number(2, 5, 0, "0099999"), "99999");  // leading zeros count for nothing
+  // A fraction below 1 is plain whatever the width.
+  EXPECT_EQ(Number(8, 3, 1, "0.5"), "0.5");
+  EXPECT_EQ(Number(8, 3, 1, 0.5), "0.5");
+  EXPECT_EQ(Number(8, 8, 3, "-0.5"), "  -0.500");
+  // Width 10, 2 decimals: 7 places before the point.
+  EXPECT_EQ(Number(2, 10, 2, "1234567"), "1234567.00");
+  EXPECT_EQ(Number(2, 10, 2, 1234567.0), "1234567.00");
+  EXPECT_EQ(Number(2, 10, 2, "12345678"), " 1.235E+07");  // P = 10 - 6
+  EXPECT_EQ(Number(2, 10, 2, 12345678.0), " 1.235E+07");
+  EXPECT_EQ(Number(1, 10, 2, "12345678"), "2345678.00");  // no exponent form in dialect 1
+  // Right-justified with blanks, decimals as the field has them; 0 is plain.
+  EXPECT_EQ(Number(2, 8, 2, "-1.5"), "   -1.50");
+  EXPECT_EQ(Number(9, 6, 0, 0.0), "     0");
+  EXPECT_EQ(Number(2, 6, 0, 1e300), "1E+300");
+  {  // wider than the field even so: cut at the field's end
+    Target t(2);
+    t.Add('N', "N", 5);
+    t.Add('C', "NEXT", 2);
+    std::string path = ScratchPath("num2.dbf");
+    ASSERT_EQ(t.Open(path), 0);
+    *t[0] = 1e300;
+    t.Set(1, "ok");
+    ASSERT_EQ(t.Write(), 0);
+    t.Close();
+    EXPECT_EQ(Written(path).Record(0), " 1E+30ok");
+  }
+  // A blank number is blanks.
+  EXPECT_EQ(Number(2, 4, 0, nullptr), "    ");
+}
+
+TEST(ToDbaseEncodeTest, DatesLogicalsAndFieldBounds) {
+  Target t(2);
+  t.Add('D', "D");
+  t.Add('L', "L");
+  t.Add('C', "C", 3);
+  std::string path = ScratchPath("dates.dbf");
+  ASSERT_EQ(t.Open(path), 0);
+  t[0]->SetDate(2024, 2, 29);
+  t[1]->SetBool(true);
+  t.Set(2, "abc");
+  ASSERT_EQ(t.Write(), 0);
+  t[0]->SetDate(12345, 6, 7);  // more than eight characters
+  t[1]->SetBool(false);
+  t.Set(2, "abcdef");  // cut on the right
+  ASSERT_EQ(t.Write(), 0);
+  t[0]->Blank();  // no date: blanks
+  t[1]->Blank();  // the format has no blank logical
+  t.Set(2, "");
+  ASSERT_EQ(t.Write(), 0);
+  t.Set(0, "2024-1");  // text that is no date, as it stands, padded to 8
+  t[1]->SetBool(true);
+  t.Set(2, "x");
+  ASSERT_EQ(t.Write(), 0);
+  EXPECT_EQ(t->InsertedRecordCount(), 4);
+  t.Close();
+  Written w(path);
+  ASSERT_EQ(w.count, 4);
+  EXPECT_EQ(w.reclen, 1 + 8 + 1 + 3);
+  EXPECT_EQ(w.Record(0), " 20240229Tabc");
+  EXPECT_EQ(w.Record(1).substr(9), "Fabc");  // the year's fifth digit stays out of the next field
+  EXPECT_EQ(w.Record(2), "         F   ");
+  EXPECT_EQ(w.Record(3).substr(1, 8).size(), 8u);
+  EXPECT_EQ(w.Record(3).substr(9), "Tx  ");
+  EXPECT_EQ(w.bytes.back(), 0x1A);
+}
+
+TEST(ToDbaseEncodeTest, TextStopsAtNulAndOnlyTextTakesTheCodePage) {
+  Target t(1, 0, 0, 850);
+  t.Add('C', "NAME", 8);
+  t.Add('M', "NOTE");
+  t.Add('N', "QTY", 3);
+  std::string path = ScratchPath("cp.dbf");
+  ASSERT_EQ(t.Open(path), 0);
+  t.Set(0, "M\xC3\xBCller");       // UTF-8 "Müller": one byte in code page 850
+  t.Set(1, "gr\xC3\xBC\xC3\x9F");  // memo text goes as it is
+  t.Set(2, "12");
+  ASSERT_EQ(t.Write(), 0);
+  t.SetBytes(0, std::string("ab\0cd", 5));  // the copy stops at the NUL byte
+  t.Set(1, nullptr);
+  t.Set(2, nullptr);
+  ASSERT_EQ(t.Write(), 0);
+  t.Close();
+  Written w(path);
+  EXPECT_EQ(w.version(), 0x83);
+  EXPECT_EQ(w.Record(0).substr(0, 9), std::string(" M\x81ller  "));
+  EXPECT_EQ(w.Record(0).substr(9, 10), "0000000001");
+  EXPECT_EQ(w.Record(0).substr(19), " 12");
+  EXPECT_EQ(w.Record(1).substr(0, 9), std::string(" ab\0\0\0\0\0\0", 9));
+  EXPECT_EQ(w.Record(1).substr(9, 10), "0000000000");  // a blank memo stores nothing
+  Bytes memo = tests::ReadFile(ScratchPath("cp.dbt"));
+  ASSERT_GE(memo.size(), 512u + 7);
+  EXPECT_EQ(std::string(memo.begin() + 512, memo.begin() + 512 + 7), "gr\xC3\xBC\xC3\x9F\x1A");
+
+  // The table reads back through the source spoke, text converted back.
+  tests::Source s(1, 0, 850);
+  ASSERT_EQ(s.Open(path), 0);
+  ASSERT_EQ(s->GetRecord(0), 0);
+  EXPECT_EQ(s.Text(0), "M\xC3\xBCller");
+  EXPECT_EQ(s.Text(1), "gr\xC3\xBC\xC3\x9F");
+}
+
+TEST(ToDbaseEncodeTest, TypeRulesAndDescriptors) {
+  // Float: N where the dialect has no float type, F where it has.
+  for (int d : {0, 1, 2, 8, 9}) {
+    SCOPED_TRACE(d);
+    Target t(d);
+    t.Add('F', "RATE", 12, 4);
+    ZQDType foreign;
+    foreign.Define("Some text;alias=Character");
+    foreign.Length(7);
+    t.AddType(foreign, "NAME", 7);
+    std::string path = ScratchPath("types.dbf");
+    ASSERT_EQ(t.Open(path), 0);
+    t.Close();
+    Written w(path);
+    if (w.narrow) continue;  // the narrow header is read in its own tests
+    ASSERT_EQ(w.FieldCount(), 2);
+    EXPECT_EQ(w.Type(0), d == 2 || d == 9 ? 'F' : 'N');
+    EXPECT_EQ(w.Length(0), 12);
+    EXPECT_EQ(w.Decimals(0), 4);
+    EXPECT_EQ(w.Type(1), 'C');  // found by its alias in the valid list
+    EXPECT_EQ(w.Length(1), 7);
+  }
+  EXPECT_EQ(Target(0)->FieldNameMaxLength(), 10);
+}
+
+TEST(ToDbaseEncodeTest, FieldCapsOfNewTables) {
+  struct Case {
+    int dialect, cap;
+  };
+  for (Case c : {Case{0, 32}, Case{3, 32}, Case{1, 128}, Case{4, 128}, Case{7, 128}, Case{2, 256}, Case{6, 256},
+                 Case{8, 1000}, Case{9, 1024}}) {
+    SCOPED_TRACE(c.dialect);
+    Target t(c.dialect);
+    EXPECT_EQ(t->MaxNewFieldCount(), c.cap);
+    int n = c.cap + 8 > 1024 ? 1024 : c.cap + 8;
+    for (int i = 0; i < n; ++i) t.Add('C', ("F" + std::to_string(i)).c_str(), 1);
+    std::string path = ScratchPath("cap.dbf");
+    ASSERT_EQ(t.Open(path), 0);
+    for (int i = 0; i < n; ++i) t.Set(i, std::to_string(i % 10).c_str());
+    ASSERT_EQ(t.Write(), 0);
+    t.Close();
+    Written w(path);
+    EXPECT_EQ(w.reclen, 1 + c.cap);
+    std::string r = w.Record(0);
+    ASSERT_EQ(r.size(), size_t(1 + c.cap));
+    EXPECT_EQ(r[1], '0');
+    EXPECT_EQ(r[size_t(c.cap)], char('0' + (c.cap - 1) % 10));
+    // The new table opens as this dialect with every field it was given.
+    tests::Source s(c.dialect);
+    ASSERT_EQ(s.Open(path), 0);
+    EXPECT_EQ(s.FieldCount(), c.cap);
+    ASSERT_EQ(s->GetRecord(0), 0);
+    EXPECT_EQ(s.Text(c.cap - 1), std::to_string((c.cap - 1) % 10));
+  }
+}
+
+TEST(ToDbaseEncodeTest, WidthsOutsideOneByteAreRefused) {
+  for (int width : {256, 300, 32000}) {
+    Target t(8);
+    LogCapture log;
+    t.Add('C', "ID", 4);
+    t.Add('C', "LONGTEXT", width);
+    std::string path = ScratchPath("wide.dbf");
+    unlink(path.c_str());
+    EXPECT_EQ(t.Open(path), ZQ_CREATE_ERROR);
+    EXPECT_EQ(log.Last(), "Field LONGTEXT has a width of " + std::to_string(width) + ", outside 1 to 255");
+    EXPECT_FALSE(ZQFileProxy::fileExists(path.c_str()));
+  }
+  Target t(8);
+  t.Add('C', "MAX", 255);
+  std::string path = ScratchPath("wide.dbf");
+  ASSERT_EQ(t.Open(path), 0);
+  t.Set(0, std::string(300, 'y').c_str());
+  ASSERT_EQ(t.Write(), 0);
+  t.Close();
+  EXPECT_EQ(Written(path).Record(0), " " + std::string(255, 'y'));
+}
+
+TEST(ToDbaseEncodeTest, RecordLengthLimit) {
+  // 16 fields of 250 make 4000 bytes: valid; one more byte passes the limit.
+  Target t(2);
+  for (int i = 0; i < 16; ++i) t.Add('C', ("C" + std::to_string(i)).c_str(), 250);
+  int at = -1;
+  EXPECT_EQ(t->ValidateLocalRecord(t.Layout(), at), 0);
+  t.Add('L', "ONE");
+  EXPECT_EQ(t->ValidateLocalRecord(t.Layout(), at), ZQ_RECORD_TOO_LONG);
+  EXPECT_EQ(at, 16);
+
+  // A memo counts 10, and 4 in dialect 10; the limit is 32767 in 8, 9, 10.
+  Target m2(2);
+  m2.Add('C', "A", 3990);
+  m2.Add('M', "NOTE");
+  EXPECT_EQ(m2->ValidateLocalRecord(m2.Layout(), at), 0);
+  m2.Add('L', "X");
+  EXPECT_EQ(m2->ValidateLocalRecord(m2.Layout(), at), ZQ_RECORD_TOO_LONG);
+  EXPECT_EQ(at, 2);
+  Target m10(10);
+  m10.Add('C', "A", 32763);
+  m10.Add('M', "NOTE");
+  EXPECT_EQ(m10->ValidateLocalRecord(m10.Layout(), at), 0);
+  m10.Add('L', "X");
+  EXPECT_EQ(m10->ValidateLocalRecord(m10.Layout(), at), ZQ_RECORD_TOO_LONG);
+  Target c8(8);
+  c8.Add('C', "A", 32767);
+  EXPECT_EQ(c8->ValidateLocalRecord(c8.Layout(), at), 0);
+  Target c1(1);
+  c1.Add('C', "A", 4001);
+  EXPECT_EQ(c1->ValidateLocalRecord(c1.Layout(), at), ZQ_RECORD_TOO_LONG);
+  EXPECT_EQ(at, 0);
+}
+
+TEST(ToDbaseEncodeTest, LayoutThatDiffersFromTheTable) {
+  Bytes table = DbfBuilder(0x03).Field("NAME", 'C', 10).Field("QTY", 'N', 5).Record({"alice", "   42"}).Build();
+  struct Case {
+    char name_letter;
+    int name_length, qty_length;
+    const char* bad;  // the field named in the message: the first difference
+  };
+  for (int mode : {1, 2}) {
+    for (Case c : {Case{'C', 12, 6, "NAME"}, Case{'C', 9, 5, "NAME"}, Case{'N', 10, 5, "NAME"},
+                   Case{'C', 10, 6, "QTY"}, Case{'D', 8, 5, "NAME"}}) {
+      SCOPED_TRACE(std::string(1, c.name_letter) + std::to_string(c.name_length) + " mode " + std::to_string(mode));
+      std::string path = tests::WriteScratch("differs.dbf", table);
+      Target t(2, mode);
+      LogCapture log;
+      t.Add(c.name_letter, "NAME", c.name_length);
+      t.Add('N', "QTY", c.qty_length);
+      EXPECT_EQ(t.Open(path), ZQ_LAYOUT_DIFFERS);
+      EXPECT_EQ(log.Last(), std::string("Field type mismatch on field ") + c.bad);
+      ASSERT_FALSE(log.entries().empty());
+      EXPECT_EQ(log.entries().back().level, 2);
+      EXPECT_EQ(t->TableHandle(), nullptr);
+      EXPECT_EQ(tests::ReadFile(path), table);  // untouched
+    }
+  }
+  // More fields on either side are no difference; a table field behind the
+  // layout's last one is written as zeros.
+  std::string path = tests::WriteScratch("fewer.dbf", table);
+  Target t(2, 1);
+  t.Add('C', "NAME", 10);
+  ASSERT_EQ(t.Open(path), 0);
+  EXPECT_EQ(t->Position(), 1);
+  t.Set(0, "bob");
+  ASSERT_EQ(t.Write(), 0);
+  t.Close();
+  Written w(path);
+  ASSERT_EQ(w.count, 2);
+  EXPECT_EQ(w.Record(0), " alice        42");
+  EXPECT_EQ(w.Record(1), std::string(" bob       \0\0\0\0\0", 16));
+}
+
+}  // namespace

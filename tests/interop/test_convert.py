@@ -1,0 +1,199 @@
+"""Tables that `zqdb convert` writes, read back by zqdb, python3-dbfread and
+python3-dbf: a table of each dialect 0-9 converted to a new table of each
+other dialect, memos included where both sides have them; and CSV -> table
+-> CSV giving the input back.
+
+What the other readers can't do, seen here:
+- Neither reads the narrow dBASE II / Enable header (dialects 0 and 3).
+- dbfread reads a dBASE IV memo 8 bytes too long (it takes the block's
+  length word, which counts the 8-byte block header, as the text's length).
+- dbfread reads a 0x8B table's memo file as dBASE IV; Enable OA (dialect 7)
+  keeps a dBASE III memo file beside its 0x8B table, so its memos are
+  compared by zqdb alone. Nobody but zqdb reads SMT (Clipper) memos.
+- python3-dbf reads only 0x03, 0x83 and 0xF5 tables; it ends a dBASE III
+  memo at two 0x1A bytes, where one ends it, and it takes only blanks for "no
+  memo", failing on the ten digits 0 of an empty memo pointer.
+"""
+
+import datetime
+import decimal
+import os
+import sys
+
+sys.path.insert(0, os.path.dirname(os.path.abspath(__file__)))
+from common import Suite, run, workdir, zqdb_fields, zqdb_rows, ZQDB  # noqa: E402
+
+import dbf  # noqa: E402
+import dbfread  # noqa: E402
+from dbfread.field_parser import FieldParser  # noqa: E402
+
+D = datetime.date
+Dec = decimal.Decimal
+
+HAS_MEMO = {1, 2, 4, 5, 6, 7, 8, 9}
+HAS_FLOAT = {2, 6, 7, 9}
+DB4_MEMO = {2, 5, 9}  # new memo files of these dialects are dBASE IV's
+TEXT = 254  # memos folded into text keep this much
+
+LONG = "".join("line %03d of a long memo, " % i for i in range(30)) + "end"  # 753 bytes, several blocks
+ROWS = [
+    # NAME, QTY, AMOUNT, RATE, BORN, OK, NOTE
+    ("Ann Lee", 42, Dec("1234.50"), Dec("0.1250"), D(1970, 1, 1), True, "first line\r\nsecond line"),
+    ("Bob", -7, Dec("-0.75"), Dec("-12.5000"), D(2000, 2, 29), False, LONG),
+    ("Çé, \"q\"", 0, Dec("0.00"), Dec("0.0000"), None, False, ""),
+    ("Zoë", 999999, Dec("9999999.99"), Dec("1234567.1234"), D(1900, 12, 31), True, "ß" * 300),
+]
+SCHEMA = "NAME C(20), QTY N(6), AMOUNT N(10,2), RATE F(12,4), BORN D, OK L, NOTE M"
+CP = ["--codepage", "1252"]
+
+
+def csv_text(rows):
+    def cell(v):
+        if v is None:
+            return ""
+        if isinstance(v, bool):
+            return "true" if v else "false"
+        s = v.isoformat() if isinstance(v, D) else str(v)
+        return '"' + s.replace('"', '""') + '"' if any(c in s for c in ',"\r\n') else s
+    lines = ["NAME,QTY,AMOUNT,RATE,BORN,OK,NOTE"] + [",".join(cell(v) for v in r) for r in rows]
+    return "\r\n".join(lines) + "\r\n"
+
+
+def expected(memo_kept, other_reader=False):
+    """Values as a table keeps them: a memo folded into text is cut to 254
+    bytes of code page 1252, one byte a character here. Memo text goes to the
+    memo file as it is, without the code page (only text fields take it), so
+    another reader that decodes the table's code page sees its UTF-8 bytes."""
+    out = []
+    for r in ROWS:
+        note = r[6] if memo_kept else r[6][:TEXT].rstrip(" ")
+        if memo_kept and other_reader:
+            note = note.encode("utf-8").decode("cp1252")
+        out.append(dict(zip(("NAME", "QTY", "AMOUNT", "RATE", "BORN", "OK", "NOTE"), r[:6] + (note or None,))))
+    return out
+
+
+def same(field, want, got):
+    if field in ("QTY", "AMOUNT", "RATE"):
+        return got is not None and Dec(str(got)) == want
+    if field == "BORN":
+        return got == want or (isinstance(got, str) and want is not None and got == want.isoformat())
+    if field == "NOTE":
+        return (got or None) == want
+    return got == want
+
+
+def compare(s, label, want, got_rows, skip=()):
+    s.check(label + " record count", len(got_rows) == len(want), "%d, expected %d" % (len(got_rows), len(want)))
+    bad = []
+    for i, (w, g) in enumerate(zip(want, got_rows)):
+        for k, v in w.items():
+            if k in skip:
+                continue
+            if not same(k, v, g.get(k)):
+                bad.append("record %d %s: %r, expected %r" % (i, k, g.get(k), v))
+    s.check(label + " values", not bad, "; ".join(bad[:4]))
+
+
+class NoMemo(FieldParser):
+    """dbfread without memo files, for tables whose memos it can't read."""
+
+    def parseM(self, field, data):
+        return None
+
+
+def dbfread_rows(path, dialect):
+    parser = NoMemo if dialect in (7, 8) else FieldParser
+    table = dbfread.DBF(path, encoding="cp1252", parserclass=parser, ignore_missing_memofile=True)
+    memo = [f.name for f in table.fields if f.type == "M"]
+    rows = [dict(r) for r in table]
+    for r in rows:
+        for name in memo:
+            if dialect in DB4_MEMO and r[name]:
+                r[name] = r[name][:-8]
+    return rows
+
+
+def pydbf_rows(path):
+    t = dbf.Table(path, codepage="cp1252")
+    t.open()
+    try:
+        rows = []
+        for rec in t:
+            row = {}
+            for name in t.field_names:
+                try:
+                    v = rec[name]
+                except TypeError:  # the ten digits 0 of an empty memo
+                    v = None
+                if isinstance(v, str):
+                    v = v.split("\x1a")[0].rstrip(" ")
+                row[name.upper()] = v
+            rows.append(row)
+        return rows
+    finally:
+        t.close()
+
+
+s = Suite("convert")
+
+with workdir() as d:
+    src_csv = os.path.join(d, "src.csv")
+    with open(src_csv, "w", encoding="utf-8", newline="") as f:
+        f.write(csv_text(ROWS))
+
+    # A table of each dialect from the CSV file.
+    for dialect in range(10):
+        path = os.path.join(d, "s%d.dbf" % dialect)
+        rc, _, err = run([ZQDB, "convert", src_csv, path, "--to", str(dialect), "--schema", SCHEMA, *CP])
+        s.check("CSV to dialect %d" % dialect, rc == 0, err.strip())
+
+    for a in range(10):
+        for b in range(10):
+            if a == b:
+                continue
+            label = "%d->%d" % (a, b)
+            src = os.path.join(d, "s%d.dbf" % a)
+            dst = os.path.join(d, "t%d_%d.dbf" % (a, b))
+            with s.case(label):
+                rc, _, err = run([ZQDB, "convert", src, dst, "--dialect", str(a), "--to", str(b), *CP])
+                if not s.check(label + " convert", rc == 0, err.strip()):
+                    continue
+                memo = a in HAS_MEMO and b in HAS_MEMO
+                want = expected(memo)
+                fields = zqdb_fields(dst, "--dialect", str(b), *CP)
+                rate = "F" if a in HAS_FLOAT and b in HAS_FLOAT else "N"
+                note = ("NOTE", "M", 10, 0) if memo else ("NOTE", "C", TEXT, 0)
+                s.check(label + " fields", fields == [("NAME", "C", 20, 0), ("QTY", "N", 6, 0), ("AMOUNT", "N", 10, 2),
+                                                      ("RATE", rate, 12, 4), ("BORN", "D", 8, 0), ("OK", "L", 1, 0),
+                                                      note], str(fields))
+                compare(s, label + " zqdb", want, zqdb_rows(dst, "--dialect", str(b), *CP))
+                with open(dst, "rb") as f:
+                    version = f.read(1)[0]
+                other = expected(memo, other_reader=True)
+                if b not in (0, 3):
+                    compare(s, label + " dbfread", other, dbfread_rows(dst, b),
+                            skip=("NOTE",) if b in (7, 8) and memo else ())
+                if version in (0x03, 0x83, 0xF5):
+                    compare(s, label + " python3-dbf", other, pydbf_rows(dst))
+
+    # CSV -> table -> CSV: the input back, for values within the inferred
+    # types (no blank logicals, one number of decimals a column).
+    rt_rows = [r for r in ROWS if r[5] is not None]
+    csv_in = csv_text([r[:6] + (r[6] or None,) for r in rt_rows])
+    rt_src = os.path.join(d, "rt.csv")
+    with open(rt_src, "w", encoding="utf-8", newline="") as f:
+        f.write(csv_in)
+    for dialect in (2, 6, 8):
+        with s.case("round trip %d" % dialect):
+            mid = os.path.join(d, "rt%d.dbf" % dialect)
+            out = os.path.join(d, "rt%d.csv" % dialect)
+            rc1, _, e1 = run([ZQDB, "convert", rt_src, mid, "--to", str(dialect), *CP])
+            rc2, _, e2 = run([ZQDB, "convert", mid, out, *CP])
+            s.check("round trip %d runs" % dialect, rc1 == 0 and rc2 == 0, (e1 + e2).strip())
+            with open(out, encoding="utf-8", newline="") as f:
+                got = f.read()
+            s.check("round trip %d gives the input back" % dialect, got == csv_in,
+                    "\n%r\n%r" % (got[:300], csv_in[:300]))
+
+s.done()

@@ -1,6 +1,9 @@
 #include "engine/convert.h"
 
+#include <dirent.h>
 #include <unistd.h>
+
+#include <cerrno>
 
 #include <cctype>
 #include <chrono>
@@ -163,29 +166,65 @@ struct FieldCheck {
   int64_t blank_logicals = 0;  // a table's logical has no blank: they become F
 };
 
-void CopyValue(ZQField* dst, ZQField* src, FieldCheck* check) {
+// A text that reads whole as a number (blanks around it allowed).
+bool IsNumberText(const ZQString& s) {
+  const char* p = s.c_str();
+  while (*p == ' ') ++p;
+  if (*p == '\0') return true;  // blank
+  char* end = nullptr;
+  strtod(p, &end);
+  if (end == p) return false;
+  while (*end == ' ') ++end;
+  return *end == '\0';
+}
+
+bool IsLogicalText(const ZQString& s) {
+  static const char* const kWords[] = {"t", "true", "y", "yes", "f", "false", "n", "no", "?", ""};
+  std::string v = Lower(std::string(s.c_str(), size_t(s.length())));
+  while (!v.empty() && v.back() == ' ') v.pop_back();
+  for (const char* w : kWords)
+    if (v == w) return true;
+  return false;
+}
+
+// Copies a value; false when the target's field can't hold it (text that is
+// no number for a number, no date for a date, no logical for a logical), so
+// that nothing is stored as something else or lost without a word.
+bool CopyValue(ZQField* dst, ZQField* src, FieldCheck* check) {
+  if (src->held() == ZQField::Held::kText) {
+    FIELDTYPE t = dst->FieldType();
+    const ZQString& s = src->StringRef();
+    bool numeric = t == FT_NUMERIC || t == FT_INTEGER || t == FT_FLOAT || t == FT_CURRENCY;
+    if (numeric && !IsNumberText(s)) return false;
+    if (t == FT_BOOLEAN && !IsLogicalText(s)) return false;
+    if (t == FT_DATE) {
+      dst->AssignText(s.c_str(), s.length());
+      return dst->held() != ZQField::Held::kText;
+    }
+  }
   switch (src->held()) {
     case ZQField::Held::kBlank:
       dst->Blank();
       if (check->letter == 'L') ++check->blank_logicals;
-      return;
+      return true;
     case ZQField::Held::kText: {
       const ZQString& s = src->StringRef();
       if ((check->letter == 'C' || check->letter == 'N' || check->letter == 'F') && s.length() > check->width)
         ++check->cut;
       dst->AssignText(s.c_str(), s.length());
-      return;
+      return true;
     }
-    case ZQField::Held::kLong: dst->SetLong(src->LongVal()); return;
-    case ZQField::Held::kDouble: *dst = src->DoubleVal(); return;
+    case ZQField::Held::kLong: dst->SetLong(src->LongVal()); return true;
+    case ZQField::Held::kDouble: *dst = src->DoubleVal(); return true;
     case ZQField::Held::kDate: {
       const ZQDate& d = src->DateRef();
       dst->SetDate(d.Year(), d.Month(), d.Day());
-      return;
+      return true;
     }
-    case ZQField::Held::kDateTime: *dst = src->DateTimeRef(); return;
-    case ZQField::Held::kBool: dst->SetBool(src->BoolVal()); return;
+    case ZQField::Held::kDateTime: *dst = src->DateTimeRef(); return true;
+    case ZQField::Held::kBool: dst->SetBool(src->BoolVal()); return true;
   }
+  return true;
 }
 
 // The text that identifies a record by its key fields, in one form for any
@@ -218,6 +257,87 @@ void KeyOf(ZQRecord& record, const std::vector<int>& key, std::string* out) {
     *out += '\x1f';
   }
 }
+
+// Reopens a table just written and checks that it holds `expected` records
+// and that the last of them reads: a write that failed only when the last
+// buffered bytes reached the disk (a full disk, a file size limit) shows
+// here, since closing a table reports nothing.
+bool VerifyTable(const std::string& path, const TableConnector& c, const std::string& dialect,
+                 const ConvertOptions& opts, int64_t expected, std::string* message) {
+  SourcePtr check = NewTableSource(c);
+  if (!check) return *message = "out of memory", false;
+  ApplyDialect(check.get(), dialect);
+  check->SetOption("codepage", std::to_string(opts.source.codepage).c_str());
+  check->SetOption("ignorememoerr", std::to_string(opts.source.memo_policy).c_str());
+  ZQConnTarget t;
+  t.path = path.c_str();
+  BATCHERR rc = check->SetUserInfo(t);
+  if (rc == 0) rc = check->MakeFields();
+  int64_t count = rc == 0 ? check->EstimateRecordCount() : -1;
+  // The last record by number, which is the last one written unless the
+  // table holds deleted records (then there are fewer live ones: 1 is fine).
+  if (rc == 0 && count == expected && expected > 0) {
+    rc = check->GetRecord(int32_t(expected - 1));
+    if (rc == ZQ_END) rc = 0;
+  }
+  check->ConnectionClose();
+  if (rc == 0 && count == expected) return true;
+  *message = "the table was not written whole (" + std::to_string(count) + " of " + std::to_string(expected) +
+             " records readable): the disk may be full or the file too large";
+  return false;
+}
+
+// A replaced table is built in a scratch directory beside the target and
+// moved into place when it is whole, so that a failed run leaves the old
+// table and its memo file as they were.
+class Staging {
+ public:
+  bool Begin(const std::string& dst, std::string* work, std::string* error) {
+    size_t slash = dst.rfind('/');
+    dir_ = slash == std::string::npos ? "." : dst.substr(0, slash == 0 ? 1 : slash);
+    std::string base = slash == std::string::npos ? dst : dst.substr(slash + 1);
+    std::string tmpl = dir_ + "/.zqdb-XXXXXX";
+    std::vector<char> buf(tmpl.begin(), tmpl.end());
+    buf.push_back('\0');
+    if (mkdtemp(buf.data()) == nullptr) {
+      *error = "cannot create " + dst + ": " + strerror(errno);
+      return false;
+    }
+    staging_ = buf.data();
+    *work = staging_ + "/" + base;
+    return true;
+  }
+  // Moves every file made into the target's directory.
+  bool Commit(std::string* error) {
+    bool ok = true;
+    for (const std::string& name : Entries())
+      if (rename((staging_ + "/" + name).c_str(), (dir_ + "/" + name).c_str()) != 0) {
+        *error = "cannot move " + name + " into " + dir_ + ": " + strerror(errno);
+        ok = false;
+      }
+    Discard();
+    return ok;
+  }
+  void Discard() {
+    if (staging_.empty()) return;
+    for (const std::string& name : Entries()) unlink((staging_ + "/" + name).c_str());
+    rmdir(staging_.c_str());
+    staging_.clear();
+  }
+  ~Staging() { Discard(); }
+
+ private:
+  std::vector<std::string> Entries() const {
+    std::vector<std::string> names;
+    if (DIR* d = opendir(staging_.c_str())) {
+      while (struct dirent* e = readdir(d))
+        if (strcmp(e->d_name, ".") != 0 && strcmp(e->d_name, "..") != 0) names.push_back(e->d_name);
+      closedir(d);
+    }
+    return names;
+  }
+  std::string dir_, staging_;
+};
 
 void DeleteImport(ZQImport* s) { delete s; }
 void DeleteExport(ZQExport* s) { delete s; }
@@ -361,6 +481,28 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
   }
   if (opts.mode == 2 && key.empty()) return Fail("update mode needs --key");
 
+  // Records a table holds before the run, to check the count after it.
+  int64_t before = 0;
+  if (existing) {
+    SourcePtr old = NewTableSource(connector);
+    ZQString v;
+    target->GetOption("version", v);
+    if (old) {
+      ApplyDialect(old.get(), v.c_str());
+      old->SetOption("ignorememoerr", "2");
+      ZQConnTarget o;
+      o.path = dst.c_str();
+      if (old->SetUserInfo(o) == 0 && old->MakeFields() == 0) before = old->EstimateRecordCount();
+      old->ConnectionClose();
+    }
+  }
+  Staging staging;
+  std::string work = dst;
+  if (dbf_target && opts.mode == 0) {
+    std::string error;
+    if (!staging.Begin(dst, &work, &error)) return Fail(error);
+    t.path = work.c_str();
+  }
   if (target->_OpenOutput(t) != 0) {
     std::string message = target->LastErrorMessage();
     return Fail(message.empty() ? "cannot create " + dst : message);
@@ -391,16 +533,28 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
   BATCHERR rc = 0;
   int32_t n = 0;
   int64_t updated = 0, added = 0;
+  std::string bad_value;
   auto fill = [&]() {
     for (size_t i = 0; i < from.size(); ++i) {
-      if (from[i] >= 0) CopyValue(out[int(i)], in[from[i]], &checks[i]);
-      else out[int(i)]->Blank();
+      if (from[i] < 0) {
+        out[int(i)]->Blank();
+      } else if (!CopyValue(out[int(i)], in[from[i]], &checks[i])) {
+        const ZQString& v = in[from[i]]->StringRef();
+        bad_value = "record " + std::to_string(n + 1) + ", field " + names[i] + ": \"" +
+                    std::string(v.c_str(), size_t(v.length() < 40 ? v.length() : 40)) + "\" doesn't fit a " +
+                    std::string(1, checks[i].letter) + " field";
+        return false;
+      }
     }
+    return true;
   };
   for (;; ++n) {
     rc = source->GetRecord(n);
     if (rc != 0) break;
-    fill();
+    if (!fill()) {
+      rc = ZQ_WRITE_ERROR;
+      break;
+    }
     if (opts.mode == 2) {
       KeyOf(out, key, &k);
       auto it = positions.find(k);
@@ -408,7 +562,7 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
         // Bring the old memo block numbers onto the fields, then the new values.
         target->SetFilePosition(it->second);
         if ((rc = target->GetandDeleteRecord(out)) != 0) break;
-        fill();
+        fill();  // the values were checked above
         ++updated;
       } else {
         target->Unwind();
@@ -422,8 +576,8 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
     progress.Tick(n);
   }
   bool ok = rc == ZQ_END;
-  std::string message;
-  if (!ok) message = source->LastErrorMessage()[0] && target->LastErrorMessage()[0] == 0
+  std::string message = bad_value;
+  if (!ok && message.empty()) message = source->LastErrorMessage()[0] && target->LastErrorMessage()[0] == 0
                          ? source->LastErrorMessage()
                          : target->LastErrorMessage();
   if (!ok && message.empty()) message = "the conversion stopped at record " + std::to_string(n);
@@ -432,6 +586,12 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
     message = target->LastErrorMessage();
   }
   source->ConnectionClose();
+  if (ok && dbf_target) {
+    ZQString v;
+    target->GetOption("version", v);
+    ok = VerifyTable(work, connector, v.c_str(), opts, before + added, &message);
+  }
+  if (ok && dbf_target && opts.mode == 0) ok = staging.Commit(&message);
   if (!ok) return Fail(message);
   for (size_t i = 0; i < checks.size(); ++i)
     if (checks[i].cut > 0)

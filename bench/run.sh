@@ -1,10 +1,12 @@
 #!/bin/bash
 # make bench: bench/run.sh BUILD_DIR/zqdb [SIZE...]
 # Times zqdb's read to CSV against pgdbf and python3-dbfread on generated
-# tables of 100,000, 1,000,000 and 4,000,000 records (kept in bench/data/).
+# tables of 100,000, 1,000,000 and 4,000,000 records (kept in bench/data/),
+# then convert (CSV and DBF to DBF) against ogr2ogr and python3-dbf.
 set -e
 if [ $# -lt 1 ] || [ ! -x "$1" ]; then
   echo "usage: bench/run.sh PATH_TO_ZQDB [SIZE...]" >&2
   exit 2
 fi
-exec /usr/bin/python3 "$(dirname "$0")/bench.py" "$@"
+/usr/bin/python3 "$(dirname "$0")/bench.py" "$@"
+/usr/bin/python3 "$(dirname "$0")/bench_convert.py" "$1"

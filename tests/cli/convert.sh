@@ -94,6 +94,19 @@ printf 'NAME,QTY,BORN\ncat,3,hello\n' >textdate.csv
 expect_run 1 convert textdate.csv app.dbf --mode append && err_has "BORN"
 same_sum app.dbf "$sum_app"
 
+# Text that looks like a logical or a number stays as it is in a text field
+# of the table ("y" is no "T", "007" no "7").
+printf 'NAME,QTY,BORN\ny,4,2021-01-01\n' >yes.csv
+expect_run 0 convert yes.csv app.dbf --mode append
+printf 'NAME,QTY,BORN\n007,5,2021-01-02\n' >zeros.csv
+expect_run 0 convert zeros.csv app.dbf --mode append
+cat_is app.dbf <<'X'
+NAME,QTY,BORN
+ann,1,2020-01-01
+y,4,2021-01-01
+007,5,2021-01-02
+X
+
 # A table that can't grow: the run fails, whatever step meets the limit
 # (here the close, which writes what is still buffered).
 python3 -c "

@@ -356,6 +356,33 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
       if (!ParseSchema(opts.schema, &schema, &error)) return Fail(error);
       static_cast<ZQFromCsv*>(csv.get())->SetSchema(schema);
     }
+    // Records that go to an existing table take the types of its fields, so
+    // that a column is read as what it will be stored as ("y" in a text
+    // field stays "y", not a logical).
+    bool into_table = !EndsWith(dst, ".csv") && !EndsWith(dst, ".jsonl") && !EndsWith(dst, ".json");
+    if (into_table && opts.mode != 0 && access(dst.c_str(), F_OK) == 0) {
+      TableConnector c;
+      std::string error;
+      if (ResolveConnector(opts.source.type, &c, &error)) {
+        TargetPtr probe = NewTableTarget(c);
+        ZQRecord layout;
+        ZQConnTarget d;
+        d.path = dst.c_str();
+        if (probe && !opts.to.empty()) ApplyDialect(probe.get(), opts.to);
+        if (probe && probe->MakeFields(layout, d) == 0) {
+          std::vector<SchemaField> hints;
+          for (int i = 0; i < layout.FieldCount(); ++i) {
+            ZQField* f = layout[i];
+            char letter = char(f->DataType().Usage());
+            if (letter == 'G' || (letter == 'B' && f->FieldType() != FT_FLOAT)) letter = 'M';
+            if (strchr("CNFDLMIYBT", letter) == nullptr || letter == 0) letter = 'C';
+            int length = letter == 'C' || letter == 'N' || letter == 'F' ? f->Length() : 0;
+            hints.push_back(SchemaField{f->Name(), letter, length, f->DecLen()});
+          }
+          static_cast<ZQFromCsv*>(csv.get())->SetTypeHints(hints);
+        }
+      }
+    }
     ZQConnTarget t;
     t.path = src.c_str();
     csv->SetUserInfo(t);
@@ -505,7 +532,11 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
   }
   if (target->_OpenOutput(t) != 0) {
     std::string message = target->LastErrorMessage();
-    return Fail(message.empty() ? "cannot create " + dst : message);
+    // The scratch path of a replaced table means nothing to the user.
+    size_t at = message.find(work);
+    if (work != dst && at != std::string::npos) message.replace(at, work.size(), dst);
+    if (message.empty()) message = "cannot create " + dst + (errno ? std::string(": ") + strerror(errno) : "");
+    return Fail(message);
   }
 
   // Update mode: one pass over the table maps each key to its position.

@@ -255,6 +255,15 @@ BATCHERR ZQFromCsv::MakeFields() {
     }
     if (!found) return LogError(4, ZQ_OPEN_ERROR, "the schema names %s, which the CSV file has no column of", sf.name.c_str());
   }
+  for (const SchemaField& h : hints_) {
+    for (size_t i = 0; i < header_.size(); ++i) {
+      if (!given[i] && strcasecmp(header_[i].c_str(), h.name.c_str()) == 0) {
+        columns[i] = h;
+        columns[i].name = header_[i];
+        given[i] = true;
+      }
+    }
+  }
   bool all_given = true;
   for (bool g : given) all_given = all_given && g;
   if (!all_given) {

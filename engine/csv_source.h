@@ -27,6 +27,10 @@ class ZQFromCsv : public ZQImport {
   ~ZQFromCsv() override;
 
   void SetSchema(const std::vector<SchemaField>& schema) { schema_ = schema; }
+  // Types for columns of these names when the schema doesn't give them (the
+  // fields of a table the records go to); names without a column are passed
+  // over.
+  void SetTypeHints(const std::vector<SchemaField>& hints) { hints_ = hints; }
   BATCHERR SetUserInfo(const ZQConnTarget& target) override;
   BATCHERR MakeFields() override;
   BATCHERR GetRecord(int32_t n) override;
@@ -42,6 +46,7 @@ class ZQFromCsv : public ZQImport {
 
   CsvReader reader_;
   std::vector<SchemaField> schema_;
+  std::vector<SchemaField> hints_;
   std::vector<std::string> header_;
   bool open_ = false;
   int32_t next_ = 0;  // logical number of the record Next() reads next

@@ -40,7 +40,53 @@ int ZQFileProxy::openfile(const char* path, const char* mode, ZQ_CSET) {
   dirty_lo_ = dirty_hi_ = -1;
   pos_ = 0;
   file_size_ = st.st_size;
+  head_valid_ = false;
+  head_len_ = 0;
+  head_dirty_lo_ = head_dirty_hi_ = -1;
   return 0;
+}
+
+bool ZQFileProxy::LoadHead() {
+  ssize_t n;
+  do n = pread(fd_, head_, kHeadSize, 0);
+  while (n < 0 && errno == EINTR);
+  if (n < 0) {
+    error_ = true;
+    return false;
+  }
+  head_len_ = int32_t(n);
+  head_valid_ = true;
+  return true;
+}
+
+bool ZQFileProxy::FlushHead() {
+  if (head_dirty_lo_ < 0) return true;
+  if (error_) return false;
+  const char* p = head_ + head_dirty_lo_;
+  int64_t off = head_dirty_lo_, left = head_dirty_hi_ - head_dirty_lo_;
+  while (left > 0) {
+    ssize_t n = pwrite(fd_, p, size_t(left), off);
+    if (n < 0 && errno == EINTR) continue;
+    if (n <= 0) {
+      error_ = true;
+      return false;
+    }
+    p += n;
+    off += n;
+    left -= n;
+  }
+  if (off > file_size_) file_size_ = off;
+  head_dirty_lo_ = head_dirty_hi_ = -1;
+  return true;
+}
+
+bool ZQFileProxy::Restart(int64_t start) {
+  if (!flush()) return false;
+  // The main buffer must never hold header bytes while the window does.
+  if (start < kHeadSize) head_valid_ = false;
+  buf_start_ = start;
+  buf_len_ = 0;
+  return true;
 }
 
 bool ZQFileProxy::EnsureBuffer() {
@@ -51,6 +97,7 @@ bool ZQFileProxy::EnsureBuffer() {
 
 bool ZQFileProxy::flush() {
   if (fd_ < 0) return false;
+  if (!FlushHead()) return false;
   if (dirty_lo_ < 0) return !error_;
   if (error_) return false;
   int64_t off = buf_start_ + dirty_lo_;
@@ -79,17 +126,17 @@ int ZQFileProxy::close(bool) {
   fd_ = -1;
   buf_len_ = 0;
   dirty_lo_ = dirty_hi_ = -1;
+  head_valid_ = false;
+  head_dirty_lo_ = head_dirty_hi_ = -1;
   return ok ? 0 : -1;
 }
 
 bool ZQFileProxy::Fill() {
-  if (!flush()) return false;
+  if (!Restart(pos_)) return false;
   if (!EnsureBuffer()) {
     error_ = true;
     return false;
   }
-  buf_start_ = pos_;
-  buf_len_ = 0;
   while (buf_len_ < kBufferSize) {
     ssize_t n = pread(fd_, buf_ + buf_len_, size_t(kBufferSize - buf_len_), buf_start_ + buf_len_);
     if (n < 0 && errno == EINTR) continue;
@@ -106,6 +153,11 @@ bool ZQFileProxy::Fill() {
 int ZQFileProxy::getch() {
   if (fd_ < 0) {
     error_ = true;
+    return -1;
+  }
+  if (InHead()) {
+    if (pos_ < head_len_) return static_cast<uint8_t>(head_[pos_++]);
+    eof_ = error_ = true;
     return -1;
   }
   int64_t rel = pos_ - buf_start_;
@@ -128,6 +180,14 @@ int32_t ZQFileProxy::read(char* buffer, int32_t n) {
   }
   int32_t done = 0;
   while (done < n) {
+    if (InHead()) {
+      if (pos_ >= head_len_) break;  // the file ends inside its header
+      int32_t take = int32_t(head_len_ - pos_ < n - done ? head_len_ - pos_ : n - done);
+      memcpy(buffer + done, head_ + pos_, size_t(take));
+      done += take;
+      pos_ += take;
+      continue;
+    }
     int64_t rel = pos_ - buf_start_;
     if (buf_ != nullptr && rel >= 0 && rel < buf_len_) {
       int32_t take = int32_t(buf_len_ - rel < n - done ? buf_len_ - rel : n - done);
@@ -136,7 +196,7 @@ int32_t ZQFileProxy::read(char* buffer, int32_t n) {
       pos_ += take;
       continue;
     }
-    if (n - done >= kBufferSize) {  // large reads go straight to the caller
+    if (n - done >= kBufferSize && pos_ >= kHeadSize) {  // large reads go straight to the caller
       if (!flush()) return done;
       ssize_t got = pread(fd_, buffer + done, size_t(n - done), pos_);
       if (got < 0 && errno == EINTR) continue;
@@ -169,12 +229,28 @@ int32_t ZQFileProxy::write(const char* buffer, int32_t n) {
   int32_t done = 0;
   while (done < n) {
     int64_t rel = pos_ - buf_start_;
+    bool in_main = rel >= 0 && rel <= buf_len_ && rel < kBufferSize;
+    // Header bytes go to the window when the main buffer is elsewhere.
+    if (pos_ < kHeadSize && (head_valid_ || !in_main || buf_len_ == 0) &&
+        (buf_len_ == 0 || buf_start_ >= kHeadSize)) {
+      if (!head_valid_ && !LoadHead()) return done;
+      int32_t take = int32_t(kHeadSize - pos_ < n - done ? kHeadSize - pos_ : n - done);
+      memcpy(head_ + pos_, buffer + done, size_t(take));
+      int32_t lo = int32_t(pos_), hi = int32_t(pos_) + take;
+      if (head_dirty_lo_ < 0 || lo < head_dirty_lo_) head_dirty_lo_ = lo;
+      if (hi > head_dirty_hi_) head_dirty_hi_ = hi;
+      if (hi > head_len_) {
+        if (lo > head_len_) memset(head_ + head_len_, 0, size_t(lo - head_len_));  // a hole reads as zeros
+        head_len_ = hi;
+      }
+      done += take;
+      pos_ += take;
+      continue;
+    }
     // The buffer takes the bytes if they start inside or right behind its
     // valid bytes; otherwise it is flushed and restarted at the position.
-    if (rel < 0 || rel > buf_len_ || rel >= kBufferSize) {
-      if (!flush()) return done;
-      buf_start_ = pos_;
-      buf_len_ = 0;
+    if (!in_main) {
+      if (!Restart(pos_)) return done;
       rel = 0;
     }
     int32_t take = int32_t(kBufferSize - rel < n - done ? kBufferSize - rel : n - done);
@@ -200,6 +276,7 @@ int64_t ZQFileProxy::size() {
   // by flushes, with what waits in the buffer, is the size: no system call.
   int64_t s = file_size_;
   if (dirty_hi_ > 0 && buf_start_ + dirty_hi_ > s) s = buf_start_ + dirty_hi_;
+  if (head_dirty_hi_ > s) s = head_dirty_hi_;
   return s;
 }
 

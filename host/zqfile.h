@@ -9,6 +9,12 @@
 // States: closed -> open (reading and writing through the buffer) -> closed.
 // A failed write puts the object in the error state; every later flush is
 // refused until clearErrors().
+//
+// The first 512 bytes (a file's header) have a window of their own while the
+// main buffer is elsewhere: a header word updated for every record appended
+// at the end (a memo file's next free block) then costs no system call. The
+// window is written out by flush() and close(), and before the main buffer
+// moves over the header.
 #pragma once
 
 #include <cstdint>
@@ -62,6 +68,15 @@ class ZQFileProxy {
  private:
   bool Fill();  // loads the buffer at pos_
   bool EnsureBuffer();
+  // Moves the main buffer to start at `start` (nothing valid in it yet);
+  // false if what it held couldn't be written.
+  bool Restart(int64_t start);
+  // True when the header window serves position pos_.
+  bool InHead() const { return head_valid_ && pos_ < kHeadSize; }
+  // Loads the header window from the file; false on a read error.
+  bool LoadHead();
+  bool FlushHead();
+  static constexpr int32_t kHeadSize = 512;
 
   int fd_ = -1;
   bool writable_ = false;
@@ -75,4 +90,8 @@ class ZQFileProxy {
   int32_t dirty_hi_ = -1;
   int64_t pos_ = 0;
   int64_t file_size_ = 0;  // size on disk as last known, for seeks from the end
+  char head_[kHeadSize];
+  bool head_valid_ = false;  // the window holds the file's bytes [0, head_len_)
+  int32_t head_len_ = 0;
+  int32_t head_dirty_lo_ = -1, head_dirty_hi_ = -1;
 };

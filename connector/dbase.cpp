@@ -138,6 +138,21 @@ BATCHERR ZQDbase::ReadRecord(int32_t n) {
   return 0;
 }
 
+void ZQDbase::DecodeText(ZQField* field, const char* raw, int32_t length, int codepage) {
+  // Trailing blanks go; they are cut on the record's bytes, so that the text
+  // is copied once, and straight into the field when no code page conversion
+  // stands between. ASCII is the same in every code page: only text with
+  // other bytes goes through the conversion.
+  int32_t kept = int32_t(bytescan::TrimRight(raw, size_t(length), ' '));
+  if (codepage != 0 && bytescan::HasHighBit(raw, size_t(kept))) {
+    FieldText.CopyN(raw, kept, 0);
+    ZQGlob::ExternalToInternal(codepage, FieldText);
+    *field = FieldText;
+  } else {
+    field->AssignText(raw, kept);
+  }
+}
+
 BATCHERR ZQDbase::GetRecord(ZQRecord& record, int32_t n, int64_t* position, bool withInfo) {
   // A table whose memo file failed under policy 0 has no layout and no
   // buffer yet: treat it as no table.
@@ -157,6 +172,14 @@ BATCHERR ZQDbase::GetRecord(ZQRecord& record, int32_t n, int64_t* position, bool
       return OwnerSpoke()->LogError(4, ZQ_READ_ERROR, lgettext(u"Field %d extends beyond end of record"), i);
     const char* raw = RecordBuffer + offset;
     const auto* bytes = reinterpret_cast<const uint8_t*>(raw);
+    const char type = char(fd->type);
+    if (type == 'C' || type == 'N' || type == 'D' || type == 'L' || type == 'F') {
+      // The plain letters, by far the most frequent, are tested first: one
+      // well-predicted branch instead of a jump through a table per field.
+      DecodeText(field, raw, length, codepage);
+      offset += length;
+      continue;
+    }
     switch (fd->type) {
       case 'M':
       case 'G':
@@ -202,22 +225,9 @@ BATCHERR ZQDbase::GetRecord(ZQRecord& record, int32_t n, int64_t* position, bool
         *field = double(int64_t(raw)) / 10000.0;
         break;
       }
-      default: {
-        // Trailing blanks go; they are cut on the record's bytes, so that the
-        // text is copied once, and straight into the field when no code page
-        // conversion stands between.
-        int32_t kept = int32_t(bytescan::TrimRight(raw, size_t(length), ' '));
-        // ASCII is the same in every code page: only text with other bytes
-        // goes through the conversion.
-        if (codepage != 0 && bytescan::HasHighBit(raw, size_t(kept))) {
-          FieldText.CopyN(raw, kept, 0);
-          ZQGlob::ExternalToInternal(codepage, FieldText);
-          *field = FieldText;
-        } else {
-          field->AssignText(raw, kept);
-        }
+      default:
+        DecodeText(field, raw, length, codepage);
         break;
-      }
     }
     offset += length;
   }

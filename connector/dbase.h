@@ -80,6 +80,9 @@ class ZQ_EXPORT ZQDbase : public ZQDbaseOptions {
   BATCHERR MakeFields(ZQRecord& layout, const ZQConnTarget& target);
   BATCHERR ReadRecord(int32_t n);
   BATCHERR GetRecord(ZQRecord& record, int32_t n, int64_t* position, bool withInfo);
+  // The decoding of C, N, F, D, L and unknown letters: trailing blanks cut,
+  // the code page converted, the text assigned.
+  void DecodeText(ZQField* field, const char* raw, int32_t length, int codepage);
   void CloseFile(const ZQConnTarget* target);
   bool IsMemoType(int type) const;
   BATCHERR GetMemoField(ZQField* field, const ZQString& pointer, bool withInfo);

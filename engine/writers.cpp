@@ -49,6 +49,17 @@ void PutCsvText(OutBuf& out, const char* s, size_t n) {
   out.Put('"');
 }
 
+// A value held in a ZQString: its buffer always has room for 16 bytes, so
+// short values are tested with a single load.
+void PutCsvString(OutBuf& out, const ZQString& s) {
+  size_t n = size_t(s.length());
+  if (n > 0 && s.Capacity() >= 16 && !bytescan::HasCsvSpecialWide(s.c_str(), n)) {
+    out.Put(s.c_str(), n);
+    return;
+  }
+  PutCsvText(out, s.c_str(), n);
+}
+
 class CsvWriter : public RecordWriter {
  public:
   explicit CsvWriter(OutBuf& out) : out_(out) {}
@@ -67,11 +78,7 @@ class CsvWriter : public RecordWriter {
       ZQField* f = record.GetFieldbyPos(i);
       switch (f->held()) {
         case ZQField::Held::kBlank: break;
-        case ZQField::Held::kText: {
-          const ZQString& s = f->StringRef();
-          PutCsvText(out_, s.c_str(), size_t(s.length()));
-          break;
-        }
+        case ZQField::Held::kText: PutCsvString(out_, f->StringRef()); break;
         case ZQField::Held::kLong: out_.PutInt(f->LongVal()); break;
         case ZQField::Held::kDouble: out_.PutDouble(f->DoubleVal()); break;
         case ZQField::Held::kDate: {

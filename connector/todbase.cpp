@@ -9,6 +9,7 @@
 
 #include "host/bytescan.h"
 #include "host/endian.h"
+#include "host/zqdate.h"
 #include "host/zqglob.h"
 #include "host/zqutil.h"
 #include "table/memo.h"
@@ -16,6 +17,22 @@
 namespace {
 
 bool IsMemoLetter(char c) { return c == 'M' || c == 'G' || c == 'B'; }
+
+// Visual FoxPro keeps these letters in binary forms of fixed width: memo
+// pointers "M" and "G" as 4-byte block numbers, "I" as a 32-bit integer,
+// "B" (a double there), "T" and "Y" in 8 bytes. 0 for the letters that are
+// text in the record.
+int32_t VfpWidth(char letter) {
+  switch (letter) {
+    case 'M':
+    case 'G':
+    case 'I': return 4;
+    case 'B':
+    case 'T':
+    case 'Y': return 8;
+    default: return 0;
+  }
+}
 
 }  // namespace
 
@@ -153,7 +170,12 @@ BATCHERR ZQToDbase::DBCreateFile(const char* path, ZQIndexDef* const* indexes) {
     fd->type = int8_t(letter);
     fd->decimals = 0;
     int32_t length;
-    if (IsMemoLetter(letter)) {
+    if (dbase.GetVersion() == DIALECT_VFOXPRO && VfpWidth(letter) != 0) {
+      length = VfpWidth(letter);
+      // "B" is a double here, yet the table's open looks for a memo file
+      // whenever a "B" field is there: the table gets an empty one.
+      memo = memo || IsMemoLetter(letter);
+    } else if (IsMemoLetter(letter)) {
       length = 10;
       memo = true;
     } else if (letter == 'F' || letter == 'N') {
@@ -200,6 +222,10 @@ bool ZQToDbase::LayoutsMatch() {
     bool differs = letter != fd->type;
     if (!differs && !dbase.IsMemoType(letter) && (letter == 'C' || letter == 'N' || letter == 'F'))
       differs = f->Length() != fd->length;
+    // The binary forms of a Visual FoxPro record are written in their fixed
+    // widths; a table whose descriptor says otherwise would be misread.
+    if (!differs && dbase.Table->dialect == DIALECT_VFOXPRO && VfpWidth(letter) != 0)
+      differs = fd->length != VfpWidth(letter);
     if (differs) {
       LogError(2, ZQ_LAYOUT_DIFFERS, lgettext(u"Field type mismatch on field %s"), f->FieldName());
       return false;
@@ -339,6 +365,7 @@ BATCHERR ZQToDbase::GenerateDetailRecord(int layout_number) {
   memset(buf, 0, size_t(room));
   ZQRecord* layout = GetLayout(0);
   int n = layout->FieldCount() < t->fieldcount ? layout->FieldCount() : t->fieldcount;
+  const bool vfp = t->dialect == DIALECT_VFOXPRO;
   int32_t offset = 0;
   for (int i = 0; i < n && offset < room; ++i) {
     ZQField* f = (*layout)[i];
@@ -346,7 +373,15 @@ BATCHERR ZQToDbase::GenerateDetailRecord(int layout_number) {
     char* dest = buf + offset;
     int32_t left = room - offset;
     int32_t width;
-    switch (letter) {
+    if (vfp && VfpWidth(letter) != 0) {
+      // Visual FoxPro: binary forms of fixed width; the memo pointer is a
+      // 4-byte block number (FormatDBMemo writes it in that form).
+      width = VfpWidth(letter);
+      if (width <= left) {
+        BATCHERR rc = letter == 'M' || letter == 'G' ? FormatDBMemo(dest, f) : EncodeVfpValue(dest, f, letter);
+        if (rc != 0) return rc;
+      }
+    } else switch (letter) {
       case 'B':
       case 'G':
       case 'M': {
@@ -437,7 +472,7 @@ BATCHERR ZQToDbase::FormatDBMemo(char* dest, ZQField* field) {
   if (t->memokind == MEMO_SMT) return FormatClipperMemo(dest, field);
   int policy = dbase.IgnoreMemoFile();
   if (policy == 2) {
-    memset(dest, '0', 10);
+    PutMemoPointer(dest, 0);
     return 0;
   }
   uint32_t old = 0;
@@ -450,22 +485,20 @@ BATCHERR ZQToDbase::FormatDBMemo(char* dest, ZQField* field) {
   if (!field->IsBlank() && t->memooff == 0) {
     uint32_t block = putmemo(t, old, field->StringRef());
     if (block != 0) {
-      char digits[12];
-      ZQMemoBlockNumber::NumbertoBuf(digits, block);
-      memcpy(dest, digits, 10);
+      PutMemoPointer(dest, block);
       return 0;
     }
     if (policy == 1) return 0;
     return LogError(4, ZQ_WRITE_ERROR, lgettext(u"Error adding memo"));
   }
   if (old == 0) {
-    memset(dest, '0', 10);
+    PutMemoPointer(dest, 0);
     return 0;
   }
   // A blank value replaces an old memo: its blocks are given up.
   if (!ReadOldMemo(old) || t->memoblksize == 0) return policy == 0 ? ZQ_READ_ERROR : 0;
   if (deloldm(t, old, MemoScratch.length() / t->memoblksize + 1) == 0) {
-    memset(dest, '0', 10);
+    PutMemoPointer(dest, 0);
     return 0;
   }
   if (policy == 1) return 0;
@@ -494,6 +527,190 @@ BATCHERR ZQToDbase::FormatClipperMemo(char* dest, ZQField* field) {
   word.Output(MemoScratch, int32_t(block));
   memcpy(dest, MemoScratch.c_str(), 10);
   return 0;
+}
+
+void ZQToDbase::PutMemoPointer(char* dest, uint32_t block) {
+  if (dbase.Table->dialect == DIALECT_VFOXPRO) {
+    PutLe32(reinterpret_cast<uint8_t*>(dest), block);
+    return;
+  }
+  char digits[12];
+  ZQMemoBlockNumber::NumbertoBuf(digits, block);
+  memcpy(dest, digits, 10);
+}
+
+namespace {
+
+// The number a field holds; false for text that is no number. Blank is 0.
+bool VfpNumber(ZQField* field, double* v) {
+  *v = 0;
+  if (field->IsBlank()) return true;
+  if (field->held() != ZQField::Held::kText) {
+    *v = field->DoubleVal();
+    return true;
+  }
+  const char* p = field->StringRef().c_str();
+  while (*p == ' ') ++p;
+  if (*p == '\0') return true;  // blanks only: no value
+  char* end = nullptr;
+  *v = strtod(p, &end);
+  while (end != p && *end == ' ') ++end;
+  return end != p && *end == '\0';
+}
+
+// A plain decimal text ("-12.3456", blanks around allowed) as ten-thousandths,
+// rounded half away from zero on the fifth decimal, without going through a
+// double. False for any other form, or a value that 64 bits can't hold.
+bool TenThousandths(const ZQString& text, int64_t* out) {
+  const char* p = text.c_str();
+  const char* end = p + text.length();
+  while (p < end && *p == ' ') ++p;
+  while (end > p && end[-1] == ' ') --end;
+  bool neg = p < end && *p == '-';
+  if (p < end && (*p == '-' || *p == '+')) ++p;
+  uint64_t v = 0;
+  int digits = 0, decimals = 0;
+  bool point = false, round_up = false;
+  for (; p < end; ++p) {
+    if (*p == '.' && !point) {
+      point = true;
+      continue;
+    }
+    if (*p < '0' || *p > '9') return false;
+    ++digits;
+    if (point && decimals >= 4) {
+      if (decimals++ == 4) round_up = *p >= '5';  // only the fifth decimal counts
+      continue;
+    }
+    if (v > (uint64_t{INT64_MAX} - 9) / 10) return false;
+    v = v * 10 + uint64_t(*p - '0');
+    if (point) ++decimals;
+  }
+  if (digits == 0) return false;
+  for (; decimals < 4; ++decimals) {
+    if (v > uint64_t{INT64_MAX} / 10) return false;
+    v *= 10;
+  }
+  if (round_up) ++v;
+  if (v > uint64_t{INT64_MAX}) return false;
+  *out = neg ? -int64_t(v) : int64_t(v);
+  return true;
+}
+
+// "YYYY-MM-DD" or "YYYYMMDD", then optionally "T" or a blank and "HH:MM" or
+// "HH:MM:SS": the Julian day and the milliseconds since midnight.
+bool VfpDateTimeText(const ZQString& text, int32_t* jdn, int32_t* ms) {
+  const char* p = text.c_str();
+  int32_t n = text.length();
+  while (n > 0 && p[n - 1] == ' ') --n;
+  auto num = [&](int32_t at, int32_t count, int32_t* value) {
+    if (at + count > n) return false;
+    *value = 0;
+    for (int32_t i = at; i < at + count; ++i) {
+      if (p[i] < '0' || p[i] > '9') return false;
+      *value = *value * 10 + (p[i] - '0');
+    }
+    return true;
+  };
+  int32_t y, m, d, at;
+  if (n >= 10 && p[4] == '-' && p[7] == '-') {
+    if (!num(0, 4, &y) || !num(5, 2, &m) || !num(8, 2, &d)) return false;
+    at = 10;
+  } else {
+    if (!num(0, 4, &y) || !num(4, 2, &m) || !num(6, 2, &d)) return false;
+    at = 8;
+  }
+  if (!IsValidDate(y, m, d)) return false;
+  int32_t h = 0, mi = 0, sec = 0;
+  if (at < n) {
+    if ((p[at] != 'T' && p[at] != ' ') || !num(at + 1, 2, &h) || at + 3 >= n || p[at + 3] != ':' ||
+        !num(at + 4, 2, &mi))
+      return false;
+    at += 6;
+    if (at < n && (p[at] != ':' || !num(at + 1, 2, &sec) || (at += 3) != n)) return false;
+    if (at != n || h > 23 || mi > 59 || sec > 59) return false;
+  }
+  *jdn = JulianDayFromDate(y, m, d);
+  *ms = (h * 3600 + mi * 60 + sec) * 1000;
+  return true;
+}
+
+}  // namespace
+
+BATCHERR ZQToDbase::EncodeVfpValue(char* dest, ZQField* field, char letter) {
+  auto* out = reinterpret_cast<uint8_t*>(dest);
+  bool ok = true;
+  switch (letter) {
+    case 'I': {
+      // A whole number within 32 bits; anything else would be stored as
+      // another number.
+      double v;
+      ok = VfpNumber(field, &v) && v == std::trunc(v) && v >= INT32_MIN && v <= INT32_MAX;
+      if (ok) PutLe32(out, uint32_t(int32_t(v)));
+      break;
+    }
+    case 'B': {
+      double v;
+      ok = VfpNumber(field, &v);
+      uint64_t bits;
+      memcpy(&bits, &v, sizeof bits);
+      if (ok) PutLe64(out, bits);
+      break;
+    }
+    case 'Y': {
+      // The value times 10000, rounded to the nearest: a double such as
+      // 1.15 is 1.1499999... and must not become 1.1499. Text is taken by
+      // its digits.
+      int64_t stored = 0;
+      if (field->IsBlank()) {
+      } else if (field->held() == ZQField::Held::kText) {
+        ok = TenThousandths(field->StringRef(), &stored);
+      } else {
+        double v = field->DoubleVal() * 10000;
+        ok = std::isfinite(v) && std::fabs(v) < 9.2e18;
+        if (ok) stored = std::llround(v);
+      }
+      if (ok) PutLe64(out, uint64_t(stored));
+      break;
+    }
+    case 'T': {
+      // Julian day, then milliseconds since midnight; no value is 8 zero
+      // bytes, which the read side takes for blank.
+      int32_t jdn = 0, ms = 0;
+      switch (field->held()) {
+        case ZQField::Held::kBlank: break;
+        case ZQField::Held::kDateTime: {
+          const ZQDateTime& dt = field->DateTimeRef();
+          int64_t day = int64_t{dt.Days()} + kZQEpochJulianDay;
+          ok = day > 0 && day <= INT32_MAX && dt.Seconds() >= 0 && dt.Seconds() < 86400;
+          jdn = int32_t(day);
+          ms = dt.Seconds() * 1000;
+          break;
+        }
+        case ZQField::Held::kDate: {
+          const ZQDate& d = field->DateRef();
+          ok = IsValidDate(d.Year(), d.Month(), d.Day());
+          if (ok) jdn = JulianDayFromDate(d.Year(), d.Month(), d.Day());
+          break;
+        }
+        case ZQField::Held::kText:
+          ok = field->IsBlank() || VfpDateTimeText(field->StringRef(), &jdn, &ms);
+          break;
+        default: ok = false; break;
+      }
+      if (ok) {
+        PutLe32(out, uint32_t(jdn));
+        PutLe32(out + 4, uint32_t(ms));
+      }
+      break;
+    }
+    default: break;
+  }
+  if (ok) return 0;
+  ZQWString value;
+  const ZQString& text = field->StringRef();
+  value.Assign(text.c_str(), 0, text.length() < 40 ? text.length() : 40);
+  return LogError(4, ZQ_WRITE_ERROR, lgettext(u"Field %s can't hold the value %s"), field->FieldName(), value.c_str());
 }
 
 // ---------------------------------------------------------------------------
@@ -529,14 +746,26 @@ BATCHERR ZQToDbase::DeleteRecord() {
   if (BATCHERR rc = dbase.ReadRecord(CurrentRecord); rc != 0) return rc;
   ZQRecord* layout = GetLayout(0);
   const int32_t room = int32_t(dbase.Table->reclen) - 1;
+  // Visual FoxPro: the pointer is a 4-byte block number, and every field
+  // takes its descriptor's width (the binary forms have no text width).
+  const bool vfp = dbase.Table->dialect == DIALECT_VFOXPRO;
   int32_t offset = 0;
   for (int i = 0; i < layout->FieldCount() && i < dbase.Table->fieldcount; ++i) {
     const ZQDBFIELD* fd = dbase.FieldList[i];
     ZQField* f = (*layout)[i];
     if (fd->type == 'M' && offset + fd->length <= room) {
-      ZQString pointer(dbase.RecordBuffer + offset, fd->length);
+      const char* at = dbase.RecordBuffer + offset;
       delete f->GetFieldInfo();
-      f->SetFieldInfo(new (std::nothrow) ZQMemoBlockNumber(pointer, 0));
+      if (vfp) {
+        uint32_t block = fd->length >= 4 ? GetLe32(reinterpret_cast<const uint8_t*>(at)) : 0;
+        f->SetFieldInfo(new (std::nothrow) ZQMemoBlockNumber(block, 0));
+      } else {
+        f->SetFieldInfo(new (std::nothrow) ZQMemoBlockNumber(ZQString(at, fd->length), 0));
+      }
+    }
+    if (vfp) {
+      offset += fd->length;
+      continue;
     }
     switch (fd->type) {
       case 'B':

@@ -64,6 +64,13 @@ class ZQ_EXPORT ZQToDbase : public ZQExport {
   // The physical record that a write at CurrentRecord goes to; -1 for none.
   int32_t PhysicalForWrite();
   void EncodeNumber(char* dest, int32_t room, ZQField* field);
+  // Visual FoxPro (dialect 10): a memo pointer as a 4-byte little-endian block
+  // number; elsewhere ten decimal digits.
+  void PutMemoPointer(char* dest, uint32_t block);
+  // Visual FoxPro: the binary forms of "I", "T", "B" and "Y" into `dest`
+  // (their fixed widths). 0, or 8 with a message for a value the form
+  // can't hold, so that no value is stored as another one.
+  BATCHERR EncodeVfpValue(char* dest, ZQField* field, char letter);
 
   mutable ZQDbase dbase{this};
   class ZQDBIndexBase** IndexObjects = nullptr;

@@ -417,6 +417,8 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
       target->GetOption("version", v);
       dialect = v.c_str();
     }
+    // Records added to an existing table go in its own dialect.
+    if (dialect.empty() && opts.mode != 0 && access(dst.c_str(), F_OK) == 0) dialect = std::to_string(GuessDialect(dst));
     if (dialect.empty()) {
       ZQString v;
       if (!csv_source && source->GetOption("version", v) == 0) dialect = v.c_str();

@@ -1,0 +1,249 @@
+"""New Visual FoxPro tables (dialect 10) that `zqdb convert --to 10` writes,
+read back by zqdb, python3-dbfread and python3-dbf; and records added to and
+replaced in a Visual FoxPro table that python3-dbf wrote.
+
+- From a table of each dialect 0-9 (made from one CSV file): text, numbers,
+  floats, dates, logicals and memos (folded into text where the source has
+  no memo type).
+- From CSV with the types of dialect 10: integers, currencies, doubles,
+  date-times and memos, one of them long enough for many 64-byte blocks.
+- python3-dbf appends to a table that zqdb made, and zqdb appends to and
+  updates a table that python3-dbf made: memos that fit their old blocks stay
+  there, blank ones are given up, new ones go to the end of the memo file.
+
+Quirks of the other readers seen here: python3-dbf strips blanks at both
+ends of text and reads a blank memo as "", dbfread as None; neither knows the
+table's code page from a Visual FoxPro header whose language byte is 0, so
+both are told cp1252.
+"""
+
+import datetime
+import decimal
+import os
+import struct
+import sys
+
+sys.path.insert(0, os.path.dirname(os.path.abspath(__file__)))
+from common import Suite, run, same_value, workdir, zqdb_fields, zqdb_rows, ZQDB  # noqa: E402
+
+import dbf  # noqa: E402
+import dbfread  # noqa: E402
+
+D = datetime.date
+DT = datetime.datetime
+Dec = decimal.Decimal
+CP = ["--codepage", "1252"]
+
+LONG = "".join("line %03d of a long memo, " % i for i in range(30)) + "end"  # 753 bytes: 12 blocks of 64
+TEXT = 254  # a memo folded into a text field keeps this much
+
+# Tables of dialects 0-9: the types they all share, and a memo.
+BASIC_SCHEMA = "NAME C(20), QTY N(6), AMOUNT N(10,2), RATE F(12,4), BORN D, OK L, NOTE M"
+BASIC = [
+    ("Ann Lee", 42, Dec("1234.50"), Dec("0.1250"), D(1970, 1, 1), True, "first line\r\nsecond line"),
+    ("Bob", -7, Dec("-0.75"), Dec("-12.5000"), D(2000, 2, 29), False, LONG),
+    ("Chloé", 0, Dec("0.00"), Dec("0.0000"), None, False, ""),
+]
+BASIC_NAMES = ("NAME", "QTY", "AMOUNT", "RATE", "BORN", "OK", "NOTE")
+
+# CSV with the types of dialect 10.
+VFP_SCHEMA = "ID I, NAME C(20), NOTE M, PRICE Y, WHEN T, RATE B, BORN D, OK L, AMT N(10,2)"
+VFP_NAMES = ("ID", "NAME", "NOTE", "PRICE", "WHEN", "RATE", "BORN", "OK", "AMT")
+VFP = [
+    (1, "alpha", "hello memo", Dec("0.57"), DT(2020, 1, 2, 3, 4, 5), 1.25, D(2001, 2, 3), True, Dec("12.34")),
+    (-2147483648, "beta", "", Dec("-3.2501"), None, Dec("-0.00000000025"), None, False, None),
+    (2147483647, "gamma", LONG, Dec("922337203.4775"), DT(1999, 12, 31, 23, 59, 59), Dec("-123456789.125"),
+     D(1970, 1, 1), True, Dec("-0.50")),
+]
+VFP_FIELDS = [("ID", "I", 4, 0), ("NAME", "C", 20, 0), ("NOTE", "M", 4, 0), ("PRICE", "Y", 8, 0),
+              ("WHEN", "T", 8, 0), ("RATE", "B", 8, 0), ("BORN", "D", 8, 0), ("OK", "L", 1, 0),
+              ("AMT", "N", 10, 2)]
+
+
+def cell(v):
+    if v is None:
+        return ""
+    if isinstance(v, bool):
+        return "true" if v else "false"
+    s = v.isoformat() if isinstance(v, (D, DT)) else format(v, "f") if isinstance(v, Dec) else str(v)
+    return '"' + s.replace('"', '""') + '"' if any(c in s for c in ',"\r\n') else s
+
+
+def write_csv(path, names, rows):
+    with open(path, "w", encoding="utf-8", newline="") as f:
+        f.write("\r\n".join([",".join(names)] + [",".join(cell(v) for v in r) for r in rows]) + "\r\n")
+
+
+def same(want, got):
+    """A value as written against one read back by any of the three readers:
+    blank text, a blank memo and no value are one; numbers by value; dates and
+    date-times as objects or as zqdb's ISO text."""
+    if want in (None, "") or got in (None, ""):
+        return want in (None, "") and got in (None, "")
+    if isinstance(want, bool) or isinstance(got, bool):
+        return want is got
+    if isinstance(want, (int, float, Dec)):
+        return isinstance(got, (int, float, Dec)) and abs(Dec(str(got)) - Dec(str(want))) <= abs(Dec(str(want))) * Dec("1e-12")
+    if isinstance(want, (D, DT)):
+        return got == want or got == want.isoformat()
+    return got == want
+
+
+def compare(s, label, names, want_rows, got_rows):
+    s.check(label + " record count", len(got_rows) == len(want_rows), "%d, expected %d" % (len(got_rows), len(want_rows)))
+    bad = []
+    for i, (w, g) in enumerate(zip(want_rows, got_rows)):
+        for k, v in zip(names, w):
+            if not same(v, g.get(k)):
+                bad.append("record %d %s: %r, expected %r" % (i, k, g.get(k), v))
+    s.check(label + " values", not bad, "; ".join(bad[:4]))
+
+
+def dbfread_rows(path):
+    return [dict(r) for r in dbfread.DBF(path, encoding="cp1252", char_decode_errors="strict")]
+
+
+def pydbf_rows(path):
+    t = dbf.Table(path, codepage="cp1252")
+    t.open()
+    try:
+        rows = []
+        for rec in t:
+            row = {}
+            for name in t.field_names:
+                v = rec[name]
+                row[name.upper()] = v.rstrip(" ") if isinstance(v, str) else v
+            rows.append(row)
+        return rows
+    finally:
+        t.close()
+
+
+def all_readers(s, label, path, names, want, fields=None):
+    """zqdb, dbfread and python3-dbf all read `want` from `path`; zqdb and
+    dbfread agree on the fields and on every value by type."""
+    with open(path, "rb") as f:
+        s.check(label + " version byte", f.read(1) == b"\x30")
+    zf = zqdb_fields(path, *CP)
+    rf = [(f.name, f.type, f.length, f.decimal_count) for f in dbfread.DBF(path, encoding="cp1252").fields]
+    s.check(label + " fields", zf == rf and (fields is None or zf == fields), "zqdb %s, dbfread %s" % (zf, rf))
+    zrows = zqdb_rows(path, *CP)
+    compare(s, label + " zqdb", names, want, zrows)
+    rrows = dbfread_rows(path)
+    compare(s, label + " dbfread", names, want, rrows)
+    compare(s, label + " python3-dbf", names, want, pydbf_rows(path))
+    letters = {f[0]: f[1] for f in rf}
+    bad = ["record %d %s: zqdb %r, dbfread %r" % (i, k, z[k], r[k])
+           for i, (z, r) in enumerate(zip(zrows, rrows)) for k in r if not same_value(letters[k], z[k], r[k])]
+    s.check(label + " zqdb and dbfread agree", not bad, "; ".join(bad[:4]))
+
+
+def memo_pointer(path, recno, field_offset):
+    """The 4-byte block number at `field_offset` (flag byte counted) of record `recno`."""
+    with open(path, "rb") as f:
+        head = f.read(12)
+        hdrlen, reclen = struct.unpack("<HH", head[8:12])
+        f.seek(hdrlen + recno * reclen + field_offset)
+        return struct.unpack("<I", f.read(4))[0]
+
+
+def fpt_next_free(path):
+    with open(path[:-3] + "fpt", "rb") as f:
+        return struct.unpack(">I", f.read(4))[0]
+
+
+s = Suite("vfp_target")
+
+with workdir() as d:
+    # From a table of each other dialect.
+    basic_csv = os.path.join(d, "basic.csv")
+    write_csv(basic_csv, BASIC_NAMES, BASIC)
+    for dialect in range(10):
+        label = "dialect %d to 10" % dialect
+        with s.case(label):
+            src = os.path.join(d, "s%d.dbf" % dialect)
+            dst = os.path.join(d, "v%d.dbf" % dialect)
+            rc, _, err = run([ZQDB, "convert", basic_csv, src, "--to", str(dialect), "--schema", BASIC_SCHEMA, *CP])
+            s.check(label + " source", rc == 0, err.strip())
+            rc, _, err = run([ZQDB, "convert", src, dst, "--dialect", str(dialect), "--to", "10", *CP])
+            if not s.check(label + " convert", rc == 0, err.strip()):
+                continue
+            memo = dialect not in (0, 3)
+            want = [r[:6] + ((r[6] if memo else r[6][:TEXT].rstrip(" ")),) for r in BASIC]
+            all_readers(s, label, dst, BASIC_NAMES, want)
+            s.check(label + " memo file", os.path.exists(dst[:-3] + "fpt") == memo)
+
+    # From CSV with integers, currencies, doubles and date-times.
+    vfp_csv = os.path.join(d, "vfp.csv")
+    write_csv(vfp_csv, VFP_NAMES, VFP)
+    made = os.path.join(d, "made.dbf")
+    with s.case("CSV to 10"):
+        rc, _, err = run([ZQDB, "convert", vfp_csv, made, "--to", "10", "--schema", VFP_SCHEMA, *CP])
+        if s.check("CSV to 10 convert", rc == 0, err.strip()):
+            # A blank double is 0: the table has no nulls.
+            want = [r[:5] + ((0.0 if r[5] is None else r[5]),) + r[6:] for r in VFP]
+            all_readers(s, "CSV to 10", made, VFP_NAMES, want, VFP_FIELDS)
+            with open(made, "rb") as f:
+                head = f.read(32)
+            s.check("CSV to 10 header", struct.unpack("<H", head[8:10])[0] == 32 * 9 + 296 and head[28] == 0x02,
+                    head.hex())
+
+    # python3-dbf adds a record with a memo to the table zqdb made; its memo
+    # goes where the FPT header says, behind ours.
+    with s.case("python3-dbf appends to ours"):
+        t = dbf.Table(made, codepage="cp1252")
+        t.open(dbf.READ_WRITE)
+        t.append((7, "py", "memo by python3-dbf", Dec("2.5"), DT(2024, 5, 6, 7, 8, 9), 1.0, D(2024, 5, 6), True,
+                  Dec("3.00")))
+        t.close()
+        rows = zqdb_rows(made, *CP)
+        s.check("python3-dbf appends to ours", len(rows) == 4 and rows[3]["NOTE"] == "memo by python3-dbf"
+                and rows[2]["NOTE"] == LONG and rows[3]["WHEN"] == "2024-05-06T07:08:09", str(rows[-1:]))
+
+    # Append and update on a table that python3-dbf wrote.
+    theirs = os.path.join(d, "theirs.dbf")
+    with s.case("python3-dbf table"):
+        t = dbf.Table(theirs, "ID I; NAME C(20); NOTE M; PRICE Y; WHEN T; RATE B; BORN D; OK L; AMT N(10,2)",
+                      dbf_type="vfp", codepage="cp1252")
+        t.open(dbf.READ_WRITE)
+        t.append((1, "alpha", "memo one, a bit longer", Dec("12.5"), DT(2020, 1, 2, 3, 4, 5), 1.25, D(2001, 2, 3),
+                  True, Dec("12.34")))
+        t.append((2, "beta", "second memo", Dec("-3.25"), None, -2.5, None, False, None))
+        t.close()
+        theirs_rows = [
+            (1, "alpha", "memo one, a bit longer", Dec("12.5"), DT(2020, 1, 2, 3, 4, 5), 1.25, D(2001, 2, 3), True,
+             Dec("12.34")),
+            (2, "beta", "second memo", Dec("-3.25"), None, -2.5, None, False, None),
+        ]
+        note_at = 1 + 4 + 20  # NOTE behind the flag, ID and NAME
+        first_block = memo_pointer(theirs, 0, note_at)
+        second_block = memo_pointer(theirs, 1, note_at)
+
+        added = [(3, "gamma", "third memo", Dec("7.5"), DT(2021, 5, 6, 7, 8, 9), 3.5, D(2002, 3, 4), False,
+                  Dec("1.5"))]
+        a_csv = os.path.join(d, "append.csv")
+        write_csv(a_csv, VFP_NAMES, added)
+        rc, _, err = run([ZQDB, "convert", a_csv, theirs, "--mode", "append", *CP])
+        if s.check("append to python3-dbf's table", rc == 0, err.strip()):
+            all_readers(s, "appended", theirs, VFP_NAMES, theirs_rows + added)
+
+        before = fpt_next_free(theirs)
+        changes = [
+            (1, "ALPHA", "memo one", Dec("13.5"), DT(2020, 1, 2, 3, 4, 6), 1.5, D(2001, 2, 4), False, Dec("2.5")),
+            (2, "BETA", "", Dec("0"), None, 0.0, None, True, None),
+            (4, "delta", "a new memo", Dec("1"), None, 0.0, None, True, None),
+        ]
+        u_csv = os.path.join(d, "update.csv")
+        write_csv(u_csv, VFP_NAMES, changes)
+        rc, _, err = run([ZQDB, "convert", u_csv, theirs, "--mode", "update", "--key", "ID", *CP])
+        if s.check("update python3-dbf's table", rc == 0, err.strip()):
+            all_readers(s, "updated", theirs, VFP_NAMES, [changes[0], changes[1], added[0], changes[2]])
+            # A shorter memo stays in its blocks, a blank one gives them up,
+            # and only the new record's memo goes to the end of the file.
+            s.check("memo reused", memo_pointer(theirs, 0, note_at) == first_block,
+                    "%d, was %d" % (memo_pointer(theirs, 0, note_at), first_block))
+            s.check("memo given up", memo_pointer(theirs, 1, note_at) == 0 and second_block != 0)
+            s.check("new memo at the end", memo_pointer(theirs, 3, note_at) == before and fpt_next_free(theirs) == before + 1,
+                    "block %d, next free %d, was %d" % (memo_pointer(theirs, 3, note_at), fpt_next_free(theirs), before))
+
+s.done()

@@ -10,3 +10,4 @@ if [ $# -lt 1 ] || [ ! -x "$1" ]; then
 fi
 /usr/bin/python3 "$(dirname "$0")/bench.py" "$@"
 /usr/bin/python3 "$(dirname "$0")/bench_convert.py" "$1"
+/usr/bin/python3 "$(dirname "$0")/bench_memo.py" "$1"

@@ -22,42 +22,36 @@ void PutDateTime(OutBuf& out, const ZQDateTime& dt) {
 // ---------------------------------------------------------------------------
 // CSV
 
+// A value in double quotes, its own quotes doubled.
+void PutCsvQuoted(OutBuf& out, const char* s, size_t n) {
+  out.Put('"');
+  const char* end = s + n;
+  while (s < end) {
+    const char* q = static_cast<const char*>(memchr(s, '"', size_t(end - s)));
+    if (q == nullptr) {
+      out.Put(s, size_t(end - s));
+      break;
+    }
+    out.Put(s, size_t(q - s) + 1);
+    out.Put('"');
+    s = q + 1;
+  }
+  out.Put('"');
+}
+
 void PutCsvText(OutBuf& out, const char* s, size_t n) {
-  if (n < OutBuf::kSize / 2) {
-    // Copy first, then test the copy: the buffer has slack behind the value,
-    // so whole 16-byte blocks can be read without running off anything.
-    char* d = out.Reserve(n + 16);
-    memcpy(d, s, n);
-    if (!bytescan::HasCsvSpecialPadded(d, n)) {
-      out.Commit(n);
-      return;
-    }
-  } else if (!bytescan::HasCsvSpecial(s, n)) {
-    out.Put(s, n);
-    return;
-  }
-  out.Put('"');
-  size_t start = 0;
-  for (size_t i = 0; i < n; ++i) {
-    if (s[i] == '"') {
-      out.Put(s + start, i - start + 1);
-      out.Put('"');
-      start = i + 1;
-    }
-  }
-  out.Put(s + start, n - start);
-  out.Put('"');
+  if (bytescan::HasCsvSpecial(s, n)) PutCsvQuoted(out, s, n);
+  else out.Put(s, n);
 }
 
 // A value held in a ZQString: its buffer always has room for 16 bytes, so
 // short values are tested with a single load.
 void PutCsvString(OutBuf& out, const ZQString& s) {
   size_t n = size_t(s.length());
-  if (n > 0 && s.Capacity() >= 16 && !bytescan::HasCsvSpecialWide(s.c_str(), n)) {
-    out.Put(s.c_str(), n);
-    return;
-  }
-  PutCsvText(out, s.c_str(), n);
+  bool special = n > 0 && s.Capacity() >= 16 ? bytescan::HasCsvSpecialWide(s.c_str(), n)
+                                               : bytescan::HasCsvSpecial(s.c_str(), n);
+  if (special) PutCsvQuoted(out, s.c_str(), n);
+  else out.Put(s.c_str(), n);
 }
 
 class CsvWriter : public RecordWriter {

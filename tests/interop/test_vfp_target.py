@@ -104,19 +104,9 @@ def dbfread_rows(path):
 
 
 def pydbf_rows(path):
-    t = dbf.Table(path, codepage="cp1252")
-    t.open()
-    try:
-        rows = []
-        for rec in t:
-            row = {}
-            for name in t.field_names:
-                v = rec[name]
-                row[name.upper()] = v.rstrip(" ") if isinstance(v, str) else v
-            rows.append(row)
-        return rows
-    finally:
-        t.close()
+    with dbf.Table(path, codepage="cp1252") as t:
+        return [{name.upper(): (v.rstrip(" ") if isinstance(v, str) else v) for name, v in zip(t.field_names, rec)}
+                for rec in t]
 
 
 def all_readers(s, label, path, names, want, fields=None):

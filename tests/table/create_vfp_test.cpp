@@ -6,7 +6,9 @@
 
 #include <unistd.h>
 
+#include <cstring>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "table/dbf.h"
@@ -19,22 +21,21 @@ using tests::Bytes;
 
 constexpr int kMemo = 0x8000;
 
-// Descriptors owned by the test; dbcreat pads their names in place.
+ZQDBFIELD Descriptor(const char* name, char type, int length, int decimals = 0) {
+  ZQDBFIELD f{};
+  strncpy(f.name, name, 11);
+  f.type = int8_t(type);
+  f.length = uint8_t(length);
+  f.decimals = uint8_t(decimals);
+  return f;
+}
+
+// dbcreat takes an array of pointers; the descriptors belong to the test,
+// and dbcreat pads their names in place.
 struct Fields {
-  Fields& Add(const std::string& name, char type, int length, int decimals = 0) {
-    ZQDBFIELD f{};
-    for (size_t i = 0; i < name.size() && i < 11; ++i) f.name[i] = name[i];
-    f.type = int8_t(type);
-    f.length = uint8_t(length);
-    f.decimals = uint8_t(decimals);
-    list.push_back(f);
-    return *this;
-  }
-  ZQDBFIELD** Ptrs() {
-    ptrs.clear();
+  explicit Fields(std::vector<ZQDBFIELD> descriptors) : list(std::move(descriptors)) {
     for (auto& f : list) ptrs.push_back(&f);
     ptrs.push_back(nullptr);
-    return ptrs.data();
   }
   std::vector<ZQDBFIELD> list;
   std::vector<ZQDBFIELD*> ptrs;
@@ -92,11 +93,11 @@ struct Open {
 
 TEST(CreateVfp, TableWithoutMemoFields) {
   // The caller's widths of the binary forms don't count: I is 4, T and Y 8.
-  Fields f;
-  f.Add("ID", 'I', 11).Add("NAME", 'C', 10).Add("WHEN", 'T', 19).Add("PRICE", 'Y', 20, 4).Add("AMOUNT", 'N', 8, 2);
+  Fields f({Descriptor("ID", 'I', 11), Descriptor("NAME", 'C', 10), Descriptor("WHEN", 'T', 19),
+            Descriptor("PRICE", 'Y', 20, 4), Descriptor("AMOUNT", 'N', 8, 2)});
   std::string path = tests::MemoScratch("vfp_plain.dbf");
   unlink(Sibling(path, "fpt").c_str());
-  ASSERT_EQ(dbcreat(path.c_str(), 5, f.Ptrs(), DIALECT_VFOXPRO, false), 0);
+  ASSERT_EQ(dbcreat(path.c_str(), 5, f.ptrs.data(), DIALECT_VFOXPRO, false), 0);
 
   Bytes b = tests::ReadFile(path);
   ASSERT_EQ(b.size(), 456u);  // 32 * 5 + 296
@@ -123,10 +124,10 @@ TEST(CreateVfp, TableWithoutMemoFields) {
 }
 
 TEST(CreateVfp, TableWithMemoFieldsAndProductionIndex) {
-  Fields f;
-  f.Add("NAME", 'C', 10).Add("NOTES", 'M', 10).Add("PIC", 'G', 10).Add("RATE", 'B', 10);
+  Fields f({Descriptor("NAME", 'C', 10), Descriptor("NOTES", 'M', 10), Descriptor("PIC", 'G', 10),
+            Descriptor("RATE", 'B', 10)});
   std::string path = tests::MemoScratch("vfp_memo.dbf");
-  ASSERT_EQ(dbcreat(path.c_str(), 4, f.Ptrs(), DIALECT_VFOXPRO | kMemo, true), 0);
+  ASSERT_EQ(dbcreat(path.c_str(), 4, f.ptrs.data(), DIALECT_VFOXPRO | kMemo, true), 0);
 
   Bytes b = tests::ReadFile(path);
   ASSERT_EQ(b.size(), 424u);  // 32 * 4 + 296
@@ -173,10 +174,9 @@ TEST(CreateVfp, DoublesOnlyGetAnEmptyMemoFile) {
   // target does in every dialect) gets an empty FPT file: the table's own open
   // looks for one whenever a "B" field is there. The flags still say that the
   // table has no memo fields.
-  Fields f;
-  f.Add("RATE", 'B', 8);
+  Fields f({Descriptor("RATE", 'B', 8)});
   std::string path = tests::MemoScratch("vfp_double.dbf");
-  ASSERT_EQ(dbcreat(path.c_str(), 1, f.Ptrs(), DIALECT_VFOXPRO | kMemo, false), 0);
+  ASSERT_EQ(dbcreat(path.c_str(), 1, f.ptrs.data(), DIALECT_VFOXPRO | kMemo, false), 0);
   Bytes b = tests::ReadFile(path);
   ASSERT_EQ(b.size(), 328u);
   EXPECT_EQ(b[0], 0x30);

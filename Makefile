@@ -37,6 +37,12 @@ demo: build
 	$(BUILD)/zqdb info examples/customers.dbf
 	@echo
 	$(BUILD)/zqdb cat examples/customers.dbf --codepage 850 --format table
+	@echo
+	@mkdir -p $(BUILD)/demo
+	$(BUILD)/zqdb convert examples/customers.dbf $(BUILD)/demo/customers.dbf --to foxpro --codepage 850 --no-progress
+	$(BUILD)/zqdb info $(BUILD)/demo/customers.dbf --type foxpro
+	$(BUILD)/zqdb convert $(BUILD)/demo/customers.dbf $(BUILD)/demo/customers.jsonl --codepage 850 --no-progress
+	head -n 3 $(BUILD)/demo/customers.jsonl
 
 test: build
 	ctest --test-dir $(BUILD) --output-on-failure -j $(JOBS)

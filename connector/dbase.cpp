@@ -54,7 +54,9 @@ BATCHERR ZQDbase::MakeFields(ZQRecord& layout, const ZQConnTarget& target) {
       return rc;
     }
   }
-  if (!ZQGlob::growbuf(Table->reclen, RecordBuffer, RecordBufferSize, nullptr)) return ZQ_NO_MEMORY;
+  // 16 bytes of room behind the record let the decoding read whole blocks.
+  if (!ZQGlob::growbuf(Table->reclen + kRecordSlack, RecordBuffer, RecordBufferSize, nullptr)) return ZQ_NO_MEMORY;
+  memset(RecordBuffer + Table->reclen, 0, kRecordSlack);
   layout.ClearFields();
   ZQSpoke* spoke = OwnerSpoke();
   for (int i = 0; i < Table->fieldcount; ++i) {
@@ -143,8 +145,8 @@ void ZQDbase::DecodeText(ZQField* field, const char* raw, int32_t length, int co
   // is copied once, and straight into the field when no code page conversion
   // stands between. ASCII is the same in every code page: only text with
   // other bytes goes through the conversion.
-  int32_t kept = int32_t(bytescan::TrimRight(raw, size_t(length), ' '));
-  if (codepage != 0 && bytescan::HasHighBit(raw, size_t(kept))) {
+  int32_t kept = int32_t(bytescan::TrimRightWide(raw, size_t(length)));
+  if (codepage != 0 && bytescan::HasHighBitWide(raw, size_t(kept))) {
     FieldText.CopyN(raw, kept, 0);
     ZQGlob::ExternalToInternal(codepage, FieldText);
     *field = FieldText;

@@ -60,6 +60,9 @@ extern const VersionName VersionNames[];
 class ZQ_EXPORT ZQDbase : public ZQDbaseOptions {
  public:
   static constexpr int memoptrlen = 10;
+  // Room behind a record in RecordBuffer, so that the decoding can read 16
+  // bytes from any field without running off the buffer.
+  static constexpr unsigned kRecordSlack = 16;
 
   ~ZQDbase() override;
   static const char** GetModifiedTypedefs();

@@ -253,10 +253,12 @@ BATCHERR ZQToDbase::_OpenOutput(const ZQConnTarget& target) {
     dbase.CloseFile(nullptr);
     return ZQ_LAYOUT_DIFFERS;
   }
-  if (!ZQGlob::growbuf(dbase.Table->reclen, dbase.RecordBuffer, dbase.RecordBufferSize, nullptr)) {
+  if (!ZQGlob::growbuf(dbase.Table->reclen + ZQDbase::kRecordSlack, dbase.RecordBuffer, dbase.RecordBufferSize,
+                       nullptr)) {
     dbase.CloseFile(nullptr);
     return ZQ_NO_MEMORY;
   }
+  memset(dbase.RecordBuffer + dbase.Table->reclen, 0, ZQDbase::kRecordSlack);
   // Logical positions start afresh for this table.
   dbase.RecordMap.Reset();
   dbase.HighRecord = -1;

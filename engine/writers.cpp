@@ -70,6 +70,11 @@ class CsvWriter : public RecordWriter {
     for (int i = 0; i < n; ++i) {
       if (i) out_.Put(',');
       ZQField* f = record.GetFieldbyPos(i);
+      // Text, the usual case, is tested first: one predictable branch.
+      if (f->held() == ZQField::Held::kText) {
+        PutCsvString(out_, f->StringRef());
+        continue;
+      }
       switch (f->held()) {
         case ZQField::Held::kBlank: break;
         case ZQField::Held::kText: PutCsvString(out_, f->StringRef()); break;

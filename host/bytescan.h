@@ -114,6 +114,37 @@ inline bool HasHighBit(const char* p, size_t n) {
   return (acc & kHighs) != 0;
 }
 
+// The two below read 16 bytes from `p` whatever `n` says: the caller's
+// buffer has that much room behind any value (the bytes there are ignored).
+
+// TrimRight of ' ' for such a buffer.
+inline size_t TrimRightWide(const char* p, size_t n) {
+#if defined(__SSE2__)
+  if (n <= 16) {
+    __m128i v = _mm_loadu_si128(reinterpret_cast<const __m128i*>(p));
+    unsigned other = ~unsigned(_mm_movemask_epi8(_mm_cmpeq_epi8(v, _mm_set1_epi8(' ')))) & ((1u << n) - 1);
+    return other ? size_t(32 - __builtin_clz(other)) : 0;
+  }
+#endif
+  return TrimRight(p, n, ' ');
+}
+
+// HasHighBit for such a buffer.
+inline bool HasHighBitWide(const char* p, size_t n) {
+#if defined(__SSE2__)
+  if (n < 16) {
+    unsigned m = unsigned(_mm_movemask_epi8(_mm_loadu_si128(reinterpret_cast<const __m128i*>(p))));
+    return (m & ((1u << n) - 1)) != 0;
+  }
+  for (size_t i = 0; i + 16 <= n; i += 16)
+    if (_mm_movemask_epi8(_mm_loadu_si128(reinterpret_cast<const __m128i*>(p + i))) != 0) return true;
+  return (n & 15) != 0 && _mm_movemask_epi8(_mm_loadu_si128(reinterpret_cast<const __m128i*>(p + n - 16))) != 0;
+#else
+  return HasHighBit(p, n);
+#endif
+}
+
+
 // HasCsvSpecial for a buffer that may be read up to 15 bytes past `n`
 // (the bytes there are ignored).
 inline bool HasCsvSpecialPadded(const char* p, size_t n) {

@@ -171,6 +171,16 @@ bool IsNumberText(const ZQString& s) {
   const char* p = s.c_str();
   while (*p == ' ') ++p;
   if (*p == '\0') return true;  // blank
+  // The usual form first, without a conversion: sign, digits, point, digits.
+  const char* q = p + (*p == '-' || *p == '+');
+  const char* digits = q;
+  while (*q >= '0' && *q <= '9') ++q;
+  if (*q == '.') ++q;
+  while (*q >= '0' && *q <= '9') ++q;
+  if (q > digits && !(q == digits + 1 && *digits == '.')) {
+    while (*q == ' ') ++q;
+    if (*q == '\0') return true;
+  }
   char* end = nullptr;
   strtod(p, &end);
   if (end == p) return false;

@@ -33,6 +33,9 @@ class CsvReader {
  private:
   // Makes at least one byte available at pos_; false at the end of the file.
   bool Fill();
+  // Splits a line of `n` bytes at `p` (in the buffer) at its commas; false
+  // when it holds a quote or a CR, which the careful path reads.
+  bool SplitPlainLine(const char* p, size_t n);
 
   static constexpr size_t kBufSize = 1 << 20;
   static constexpr size_t kMaxRecord = 64 << 20;  // a longer record is an error

@@ -27,6 +27,7 @@ import subprocess
 import sys
 
 sys.path.insert(0, os.path.dirname(os.path.abspath(__file__)))
+import gen_table  # noqa: E402
 from bench import timed  # noqa: E402
 
 HERE = os.path.dirname(os.path.abspath(__file__))
@@ -61,20 +62,6 @@ def memo_text(i):
     return POOL[start:start + n]
 
 
-def table_header(version, count):
-    h = bytearray(32)
-    h[0] = version
-    h[1:4] = bytes([124, 1, 1])
-    struct.pack_into("<IHH", h, 4, count, HEADER_LEN, RECORD_LEN)
-    for name, letter, length, dec in FIELDS:
-        d = bytearray(32)
-        d[0:len(name)] = name.encode()
-        d[11:12] = letter
-        d[16], d[17] = length, dec
-        h += d
-    return bytes(h) + b"\x0d"
-
-
 def generate(path, kind, n):
     """Writes the table `path` with n records and its memo file of `kind`."""
     version = KINDS[kind][0]
@@ -83,7 +70,7 @@ def generate(path, kind, n):
     block = MEMO_HEADER // block_size
     recs, memos = [], []
     with open(path, "wb") as t, open(memo_path, "wb") as m:
-        t.write(table_header(version, n))
+        t.write(gen_table.header(n, FIELDS, version))
         m.write(b"\0" * MEMO_HEADER)
         for i in range(n):
             text = memo_text(i)

@@ -31,12 +31,14 @@ NOTES = [b"", b"call back after the holidays", b"prefers email", b"VIP customer 
          b"order pending; needs approval from the branch office", b"duplicate of an older entry?", b""]
 
 
-def header(count):
+def header(count, fields=FIELDS, version=0x03):
+    """The wide header of a table of `count` records with `fields`
+    (name, type letter, width, decimals), ended by 0x0D."""
     h = bytearray(32)
-    h[0] = 0x03
+    h[0] = version
     h[1:4] = bytes([124, 1, 1])
-    struct.pack_into("<IHH", h, 4, count, HEADER_LEN, RECORD_LEN)
-    for name, letter, length, dec in FIELDS:
+    struct.pack_into("<IHH", h, 4, count, 32 + 32 * len(fields) + 1, 1 + sum(f[2] for f in fields))
+    for name, letter, length, dec in fields:
         d = bytearray(32)
         d[0:len(name)] = name.encode()
         d[11:12] = letter

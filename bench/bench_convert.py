@@ -30,8 +30,8 @@ from bench import DATA, table, timed  # noqa: E402
 
 PYDBF_SHARE = 10  # python3-dbf writes 1/10 of the rows; its time is scaled by 10
 PYDBF_LOOP = ("import csv, dbf, sys\n"
-              "src, dst, spec = sys.argv[1:4]\n"
-              "t = dbf.Table(dst, spec, dbf_type='db3', codepage='cp1252')\n"
+              "src, dst, fields = sys.argv[1:4]\n"
+              "t = dbf.Table(dst, fields, dbf_type='db3', codepage='cp1252')\n"
               "t.open(dbf.READ_WRITE)\n"
               "with open(src, newline='', encoding='utf-8') as f:\n"
               "    r = csv.reader(f)\n"

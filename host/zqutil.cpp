@@ -72,7 +72,7 @@ constexpr int kMaxArgs = 16;
 
 enum class ArgKind : uint8_t { kNone, kInt, kInt64, kDouble, kStr, kWStr, kChar };
 
-struct Spec {
+struct Conversion {
   int pos;  // argument index from 0
   char flags[8];
   int width;      // -1 none
@@ -106,7 +106,7 @@ void AppendWide(ZQString& out, const wchar* w) {
   }
 }
 
-ArgKind KindOf(const Spec& s) {
+ArgKind KindOf(const Conversion& s) {
   switch (s.conv) {
     case 'd': case 'i': case 'u': case 'x': case 'X': case 'o':
       return s.longs >= 2 ? ArgKind::kInt64 : ArgKind::kInt;
@@ -120,8 +120,8 @@ ArgKind KindOf(const Spec& s) {
 }
 
 // Parses the conversion at format[i] (just behind '%'); false if malformed.
-bool ParseSpec(const wchar* f, size_t& i, int& next_pos, Spec& s) {
-  s = Spec{next_pos, {0}, -1, -1, 0, 0, 0};
+bool ParseConversion(const wchar* f, size_t& i, int& next_pos, Conversion& s) {
+  s = Conversion{next_pos, {0}, -1, -1, 0, 0, 0};
   size_t save = i;
   int num = 0;
   bool digits = false;
@@ -170,8 +170,8 @@ void FormatMessageV(ZQString& out, const wchar* format, va_list args) {
       ++i;
       continue;
     }
-    Spec s;
-    if (!ParseSpec(format, i, next, s)) break;
+    Conversion s;
+    if (!ParseConversion(format, i, next, s)) break;
     kinds[s.pos] = KindOf(s);
     if (s.pos > max_pos) max_pos = s.pos;
   }
@@ -208,35 +208,35 @@ void FormatMessageV(ZQString& out, const wchar* format, va_list args) {
       continue;
     }
     size_t start = i;
-    Spec s;
-    if (!ParseSpec(format, i, next, s)) {
+    Conversion s;
+    if (!ParseConversion(format, i, next, s)) {
       out += '%';
       i = start;
       continue;
     }
-    char spec[32];
+    char fmt[32];
     int w = s.width, p = s.precision;
     char buf[128];
     const Arg& a = vals[s.pos];
     switch (KindOf(s)) {
       case ArgKind::kInt:
-        snprintf(spec, sizeof spec, "%%%s%s%s%c", s.flags, w >= 0 ? "*" : "", p >= 0 ? ".*" : "", s.conv);
-        if (w >= 0 && p >= 0) snprintf(buf, sizeof buf, spec, w, p, a.i);
-        else if (w >= 0) snprintf(buf, sizeof buf, spec, w, a.i);
-        else if (p >= 0) snprintf(buf, sizeof buf, spec, p, a.i);
-        else snprintf(buf, sizeof buf, spec, a.i);
+        snprintf(fmt, sizeof fmt, "%%%s%s%s%c", s.flags, w >= 0 ? "*" : "", p >= 0 ? ".*" : "", s.conv);
+        if (w >= 0 && p >= 0) snprintf(buf, sizeof buf, fmt, w, p, a.i);
+        else if (w >= 0) snprintf(buf, sizeof buf, fmt, w, a.i);
+        else if (p >= 0) snprintf(buf, sizeof buf, fmt, p, a.i);
+        else snprintf(buf, sizeof buf, fmt, a.i);
         out += buf;
         break;
       case ArgKind::kInt64:
-        snprintf(spec, sizeof spec, "%%%s%sll%c", s.flags, w >= 0 ? "*" : "", s.conv);
-        if (w >= 0) snprintf(buf, sizeof buf, spec, w, static_cast<long long>(a.l));
-        else snprintf(buf, sizeof buf, spec, static_cast<long long>(a.l));
+        snprintf(fmt, sizeof fmt, "%%%s%sll%c", s.flags, w >= 0 ? "*" : "", s.conv);
+        if (w >= 0) snprintf(buf, sizeof buf, fmt, w, static_cast<long long>(a.l));
+        else snprintf(buf, sizeof buf, fmt, static_cast<long long>(a.l));
         out += buf;
         break;
       case ArgKind::kDouble:
-        snprintf(spec, sizeof spec, "%%%s%s%c", s.flags, p >= 0 ? ".*" : "", s.conv);
-        if (p >= 0) snprintf(buf, sizeof buf, spec, p, a.d);
-        else snprintf(buf, sizeof buf, spec, a.d);
+        snprintf(fmt, sizeof fmt, "%%%s%s%c", s.flags, p >= 0 ? ".*" : "", s.conv);
+        if (p >= 0) snprintf(buf, sizeof buf, fmt, p, a.d);
+        else snprintf(buf, sizeof buf, fmt, a.d);
         out += buf;
         break;
       case ArgKind::kChar: out += char(a.i); break;

@@ -212,14 +212,14 @@ int main(int argc, char** argv) {
     uint8_t len, dec;
   } kFields[kFieldCount] = {{"NAME", 'C', kNameLen, 0}, {"QTY", 'N', kQtyLen, 2}, {"BORN", 'D', 8, 0}, {"OK", 'L', 1, 0},
                             {"NOTE", 'M', 10, 0}};
-  ZQDBFIELD spec[kFieldCount] = {};
+  ZQDBFIELD descriptors[kFieldCount] = {};
   ZQDBFIELD* fields[kMaxFields] = {};
   for (int i = 0; i < kFieldCount; ++i) {
-    strcpy(spec[i].name, kFields[i].name);
-    spec[i].type = int8_t(kFields[i].type);
-    spec[i].length = kFields[i].len;
-    spec[i].decimals = kFields[i].dec;
-    fields[i] = &spec[i];
+    strcpy(descriptors[i].name, kFields[i].name);
+    descriptors[i].type = int8_t(kFields[i].type);
+    descriptors[i].length = kFields[i].len;
+    descriptors[i].decimals = kFields[i].dec;
+    fields[i] = &descriptors[i];
   }
   if (dbcreat(path, kFieldCount, fields, dialect | 0x8000, false) != 0) {
     fprintf(stderr, "memo_table_writer: dbcreat failed\n");

@@ -7,6 +7,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstdlib>
 #include <cstring>
 
@@ -156,8 +157,15 @@ bool ModuleRegistry::ScanFile(const std::string& path, std::vector<std::string>*
   if (fd < 0) return false;
   struct stat st;
   bool ok = false;
-  if (fstat(fd, &st) == 0 && S_ISREG(st.st_mode) && st.st_size >= trailer::kTailSize) {
-    size_t want = size_t(st.st_size < off_t(kMaxTrailer) + 16 ? st.st_size : off_t(kMaxTrailer) + 16);
+  uint8_t last[trailer::kTailSize];
+  if (fstat(fd, &st) == 0 && S_ISREG(st.st_mode) && st.st_size >= trailer::kTailSize &&
+      pread(fd, last, sizeof last, st.st_size - off_t(sizeof last)) == ssize_t(sizeof last) &&
+      memcmp(last + 8, trailer::kMagic, 8) == 0) {
+    // The magic is there: read as much as the trailer says it takes (the
+    // parser checks that against the file), at most the largest trailer.
+    uint64_t said = uint64_t{GetBe32(last + 4)} + trailer::kTailSize;
+    uint64_t cap = std::min<uint64_t>(uint64_t(st.st_size), uint64_t{kMaxTrailer} + trailer::kTailSize);
+    size_t want = size_t(std::min(said, cap));
     std::vector<uint8_t> tail(want);
     uint8_t head[4] = {0};
     bool read_ok = pread(fd, tail.data(), want, st.st_size - off_t(want)) == ssize_t(want) &&

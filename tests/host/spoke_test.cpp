@@ -128,23 +128,4 @@ TEST(ZQFieldTest, RenderFlagsDatesAndNumbers) {
   EXPECT_EQ(Text(t.StringRef()), "2000-01-01T01:01:01");
 }
 
-TEST(ZQRecordTest, OwnedAndBorrowedFields) {
-  ZQRecord r;
-  ZQDType text = Defined("Text;usage=0x43");
-  ASSERT_NE(r.NewField(text, "NAME"), nullptr);
-  ASSERT_NE(r.NewField(text, "CITY"), nullptr);
-  ZQField borrowed(text, "EXTRA");
-  ASSERT_TRUE(r.InstallField(1, &borrowed));
-  EXPECT_EQ(r.FieldCount(), 3);
-  EXPECT_EQ(r[1], &borrowed);
-  EXPECT_EQ(r.GetFieldbyName("city"), r[2]);
-  EXPECT_EQ(r.GetFieldbyName("nope"), nullptr);
-  *r[0] = ZQString("x");
-  r.BlankFields();
-  EXPECT_TRUE(r[0]->IsBlank());
-  r.ClearFields();  // the borrowed field stays alive
-  EXPECT_EQ(r.FieldCount(), 0);
-  EXPECT_STREQ(borrowed.Name(), "EXTRA");
-}
-
 }  // namespace

@@ -111,22 +111,6 @@ TEST(ZQStringTest, EditingOperations) {
   blanks.StripChars(false, true, ' ');
   EXPECT_EQ(blanks.length(), 0);
 
-  ZQString p("x");
-  EXPECT_TRUE(p.Pad('.', 3));
-  EXPECT_TRUE(p.Pad('.', 0));
-  EXPECT_TRUE(p.Pad('.', -4));
-  EXPECT_EQ(Bytes(p), "x...");
-  EXPECT_TRUE(p.Set('\0', 3));
-  EXPECT_EQ(Bytes(p), std::string(3, '\0'));
-
-  ZQString u("aZ\xE9");
-  u.ToUpper();
-  EXPECT_EQ(Bytes(u), "AZ\xE9");  // only ASCII letters change
-  u.ToLower();
-  EXPECT_EQ(Bytes(u), "az\xE9");
-  u.Replace(1, 'q');
-  u.Replace(9, 'q');
-  EXPECT_EQ(Bytes(u), "aq\xE9");
 }
 
 TEST(ZQWStringTest, WidensUtf8AndKeepsOtherBytes) {

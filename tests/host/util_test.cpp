@@ -105,22 +105,6 @@ TEST(NextKeywordTest, TakesLinesOffAndExtractsTheirValues) {
   EXPECT_FALSE(NextKeyword(keyword, last));
 }
 
-TEST(LittleHelpersTest, NumbersAndCaseFreeCompare) {
-  char buf[8] = {};
-  char* p = stw_long(buf, -2);
-  EXPECT_EQ(p, buf + 4);
-  EXPECT_EQ(std::string(buf, 4), "\xFE\xFF\xFF\xFF");
-  buf[4] = '\x34';
-  buf[5] = '\x12';
-  char* q = buf;
-  EXPECT_EQ(str_long(&q), -2);
-  EXPECT_EQ(str_short(&q), 0x1234);
-  EXPECT_EQ(q, buf + 6);
-  EXPECT_EQ(strcmpi("dBase IV", "DBASE iv"), 0);
-  EXPECT_NE(strcmpi("dBASE IV", "dBASE III"), 0);
-  EXPECT_EQ(ZQGlob::stricmp("_NULLFLAGS", "_NullFlags"), 0);
-}
-
 TEST(ZQGlobTest, SplitsAndJoinsPaths) {
   char path[64] = "/data/dir/table.dbf";
   char name[64], ext[64];

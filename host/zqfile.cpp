@@ -59,13 +59,10 @@ bool ZQFileProxy::LoadHead() {
   return true;
 }
 
-bool ZQFileProxy::FlushHead() {
-  if (head_dirty_lo_ < 0) return true;
+bool ZQFileProxy::WriteOut(const char* p, int64_t off, int64_t len) {
   if (error_) return false;
-  const char* p = head_ + head_dirty_lo_;
-  int64_t off = head_dirty_lo_, left = head_dirty_hi_ - head_dirty_lo_;
-  while (left > 0) {
-    ssize_t n = pwrite(fd_, p, size_t(left), off);
+  while (len > 0) {
+    ssize_t n = pwrite(fd_, p, size_t(len), off);
     if (n < 0 && errno == EINTR) continue;
     if (n <= 0) {
       error_ = true;
@@ -73,9 +70,15 @@ bool ZQFileProxy::FlushHead() {
     }
     p += n;
     off += n;
-    left -= n;
+    len -= n;
   }
   if (off > file_size_) file_size_ = off;
+  return true;
+}
+
+bool ZQFileProxy::FlushHead() {
+  if (head_dirty_lo_ < 0) return true;
+  if (!WriteOut(head_ + head_dirty_lo_, head_dirty_lo_, head_dirty_hi_ - head_dirty_lo_)) return false;
   head_dirty_lo_ = head_dirty_hi_ = -1;
   return true;
 }
@@ -99,22 +102,7 @@ bool ZQFileProxy::flush() {
   if (fd_ < 0) return false;
   if (!FlushHead()) return false;
   if (dirty_lo_ < 0) return !error_;
-  if (error_) return false;
-  int64_t off = buf_start_ + dirty_lo_;
-  const char* p = buf_ + dirty_lo_;
-  int64_t left = dirty_hi_ - dirty_lo_;
-  while (left > 0) {
-    ssize_t n = pwrite(fd_, p, size_t(left), off);
-    if (n < 0 && errno == EINTR) continue;
-    if (n <= 0) {
-      error_ = true;
-      return false;
-    }
-    p += n;
-    off += n;
-    left -= n;
-  }
-  if (off > file_size_) file_size_ = off;
+  if (!WriteOut(buf_ + dirty_lo_, buf_start_ + dirty_lo_, dirty_hi_ - dirty_lo_)) return false;
   dirty_lo_ = dirty_hi_ = -1;
   return true;
 }

@@ -76,6 +76,9 @@ class ZQFileProxy {
   // Loads the header window from the file; false on a read error.
   bool LoadHead();
   bool FlushHead();
+  // Writes `len` bytes at file offset `off`; false (and the error state) on
+  // failure.
+  bool WriteOut(const char* p, int64_t off, int64_t len);
   static constexpr int32_t kHeadSize = 512;
 
   int fd_ = -1;

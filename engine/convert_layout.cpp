@@ -5,8 +5,6 @@
 
 #include "engine/text_util.h"
 
-// A name the target accepts: its character sets and its longest name, and
-// different from the names already taken.
 std::string TargetName(ZQExport* target, const std::string& source, const std::vector<std::string>& taken) {
   ZQString first, second;
   target->FieldNameCharSet(first, second);
@@ -42,8 +40,6 @@ static const ZQDType* ValidType(ZQExport* target, char letter, FIELDTYPE family)
 }
 
 
-// The target type of a source field: the same letter where the target has
-// it, else the nearest type that keeps the value.
 bool PlanType(ZQExport* target, const ZQField* src, Planned* out) {
   const ZQDType& st = src->DataType();
   char letter = char(st.Usage());

@@ -36,9 +36,6 @@ static bool IsLogicalText(const ZQString& s) {
   return false;
 }
 
-// Copies a value; false when the target's field can't hold it (text that is
-// no number for a number, no date for a date, no logical for a logical), so
-// that nothing is stored as something else or lost without a word.
 bool CopyValue(ZQField* dst, ZQField* src, FieldCheck* check) {
   if (src->held() == ZQField::Held::kText) {
     FIELDTYPE t = dst->FieldType();
@@ -76,8 +73,6 @@ bool CopyValue(ZQField* dst, ZQField* src, FieldCheck* check) {
   return true;
 }
 
-// The text that identifies a record by its key fields, in one form for any
-// spoke: numbers by value, dates as yyyymmdd, text without trailing blanks.
 void KeyOf(ZQRecord& record, const std::vector<int>& key, std::string* out) {
   out->clear();
   for (int i : key) {

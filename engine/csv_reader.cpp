@@ -37,7 +37,6 @@ bool CsvReader::Rewind() {
   pos_ = len_ = 0;
   eof_ = false;
   line_ = record_line_ = 1;
-  consumed_ = 0;
   error_.clear();
   // A byte order mark at the start is not data.
   if (Fill() && len_ >= 3 && memcmp(buf_, "\xEF\xBB\xBF", 3) == 0) pos_ = 3;
@@ -55,7 +54,6 @@ bool CsvReader::Fill() {
     if (n < 0) error_ = strerror(errno);
     return false;
   }
-  consumed_ += n;
   pos_ = 0;
   len_ = size_t(n);
   return true;

@@ -28,7 +28,6 @@ class CsvReader {
   // 1-based line on which the current record starts.
   int64_t Line() const { return record_line_; }
   const std::string& error() const { return error_; }
-  int64_t BytesRead() const { return consumed_; }
 
  private:
   // Makes at least one byte available at pos_; false at the end of the file.
@@ -43,7 +42,7 @@ class CsvReader {
   char* buf_ = nullptr;
   size_t pos_ = 0, len_ = 0;
   bool eof_ = false;
-  int64_t line_ = 1, record_line_ = 1, consumed_ = 0;
+  int64_t line_ = 1, record_line_ = 1;
   std::string field_data_;
   // Where the current record's fields are: in the read buffer itself for a
   // plain line (no copy), else (NULL) in field_data_. Field i spans

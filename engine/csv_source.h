@@ -38,7 +38,6 @@ class ZQFromCsv : public ZQImport {
   BATCHERR ConnectionClose() override;
   int64_t EstimateRecordCount() override { return rows_; }
   bool EstimateIsAccurate() override { return rows_known_; }
-  int64_t BytesRead() const { return reader_.BytesRead(); }
 
  private:
   BATCHERR Infer(std::vector<SchemaField>* columns);

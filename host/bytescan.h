@@ -144,25 +144,4 @@ inline bool HasHighBitWide(const char* p, size_t n) {
 #endif
 }
 
-
-// HasCsvSpecial for a buffer that may be read up to 15 bytes past `n`
-// (the bytes there are ignored).
-inline bool HasCsvSpecialPadded(const char* p, size_t n) {
-#if defined(__SSE2__)
-  const __m128i comma = _mm_set1_epi8(','), quote = _mm_set1_epi8('"');
-  const __m128i lf = _mm_set1_epi8('\n'), cr = _mm_set1_epi8('\r');
-  for (size_t i = 0; i < n; i += 16) {
-    __m128i v = _mm_loadu_si128(reinterpret_cast<const __m128i*>(p + i));
-    __m128i hit = _mm_or_si128(_mm_or_si128(_mm_cmpeq_epi8(v, comma), _mm_cmpeq_epi8(v, quote)),
-                               _mm_or_si128(_mm_cmpeq_epi8(v, lf), _mm_cmpeq_epi8(v, cr)));
-    unsigned mask = unsigned(_mm_movemask_epi8(hit));
-    if (n - i < 16) mask &= (1u << (n - i)) - 1;
-    if (mask != 0) return true;
-  }
-  return false;
-#else
-  return HasCsvSpecial(p, n);
-#endif
-}
-
 }  // namespace bytescan

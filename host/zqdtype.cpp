@@ -15,11 +15,13 @@ struct BaseType {
 };
 
 // The base names the host knows, with the kind and value family they imply.
+// Dates and dBASE numbers are doubles in binary form (their index keys are
+// 8-byte doubles); their table form is text all the same.
 constexpr BaseType kBaseTypes[] = {
     {"Text", DT_TEXT, FT_TEXT, 0},          {"Memo", DT_TEXT, FT_TEXT, 0},
-    {"Binary", DT_TEXT, FT_BINARY, 0},      {"Date", DT_TEXT, FT_DATE, 8},
+    {"Binary", DT_TEXT, FT_BINARY, 0},      {"Date", DT_DOUBLE, FT_DATE, 8},
     {"DateTime", DT_TEXT, FT_DATETIME, 8},  {"Boolean", DT_TEXT, FT_BOOLEAN, 1},
-    {"dBASE Numeric", DT_TEXT, FT_NUMERIC, 0}, {"Integer", DT_LONG, FT_INTEGER, 4},
+    {"dBASE Numeric", DT_DOUBLE, FT_NUMERIC, 0}, {"Integer", DT_LONG, FT_INTEGER, 4},
     {"Float", DT_DOUBLE, FT_FLOAT, 8},
 };
 

@@ -26,15 +26,15 @@ TEST(ZQDTypeTest, DefinesTheTwelveConnectorTypes) {
     const char* picture;
   };
   const Case cases[] = {
-      {"Date;usage=0x44;picture=yyyymmdd;picture_settable=0", 0x44, "", FT_DATE, DT_TEXT, "yyyymmdd"},
+      {"Date;usage=0x44;picture=yyyymmdd;picture_settable=0", 0x44, "", FT_DATE, DT_DOUBLE, "yyyymmdd"},
       {"Boolean;alias=Logical;usage=0x4c;picture=T.F;picture_settable=False", 0x4C, "Logical", FT_BOOLEAN,
        DT_TEXT, "T.F"},
-      {"dBASE Numeric;decsep=.;alias=Numeric;usage=0x4e", 0x4E, "Numeric", FT_NUMERIC, DT_TEXT, ""},
+      {"dBASE Numeric;decsep=.;alias=Numeric;usage=0x4e", 0x4E, "Numeric", FT_NUMERIC, DT_DOUBLE, ""},
       {"Text;alias=Character;usage=0x43;maxlength=254;maxprecision=254", 0x43, "Character", FT_TEXT, DT_TEXT, ""},
       {"Memo;alias=Memo;usage=0x4d;length=255;length_invalid;maxlength=32000;maxprecision=32000;"
        "padchar_invalid;varlen_invalid",
        0x4D, "Memo", FT_TEXT, DT_TEXT, ""},
-      {"dBASE Numeric;alias=Float;decsep=.;usage=0x46", 0x46, "Float", FT_NUMERIC, DT_TEXT, ""},
+      {"dBASE Numeric;alias=Float;decsep=.;usage=0x46", 0x46, "Float", FT_NUMERIC, DT_DOUBLE, ""},
       {"Binary;alias=Ole;usage=0x47", 0x47, "Ole", FT_BINARY, DT_TEXT, ""},
       {"Binary;usage=0x42", 0x42, "", FT_BINARY, DT_TEXT, ""},
       {"Float;alias=Double;decsep=.;usage=0x42", 0x42, "Double", FT_FLOAT, DT_DOUBLE, ""},

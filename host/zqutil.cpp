@@ -268,3 +268,23 @@ void EmitLog(int level, BATCHERR code, const char* message) {
   if (g_sink != nullptr) g_sink(g_sink_context, level, code, message);
   else fprintf(stderr, "%s\n", message);
 }
+
+namespace {
+ZQConsoleSink console_sink = nullptr;
+}
+
+void SetConsoleSink(ZQConsoleSink sink) { console_sink = sink; }
+
+void ConsolePrintf(const char* format, ...) {
+  char line[1024];
+  va_list args;
+  va_start(args, format);
+  vsnprintf(line, sizeof line, format, args);
+  va_end(args);
+  if (console_sink != nullptr) {
+    console_sink(line);
+  } else {
+    fputs(line, stdout);
+    fflush(stdout);
+  }
+}

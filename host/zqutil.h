@@ -35,3 +35,11 @@ void FormatMessage(ZQString& out, const wchar* format, ...);
 using ZQLogSink = void (*)(void* context, int level, BATCHERR code, const char* message);
 void SetLogSink(ZQLogSink sink, void* context);
 void EmitLog(int level, BATCHERR code, const char* message);
+
+// The console: the few diagnostic lines a module prints for the person at the
+// terminal. Standard output unless the engine sends them elsewhere (zqdb sends
+// them to standard error, so that they never mix with data on standard output).
+using ZQConsoleSink = void (*)(const char* text);
+void SetConsoleSink(ZQConsoleSink sink);
+// Prints a printf-style narrow format on the console.
+void ConsolePrintf(const char* format, ...) __attribute__((format(printf, 1, 2)));

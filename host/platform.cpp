@@ -7,6 +7,20 @@
 #include <climits>
 #include <ctime>
 
+namespace {
+
+// The file position of each descriptor that _open made, kept here so that a
+// seek costs no system call and a read or write is one pread or pwrite: the
+// index code seeks before every block it reads or writes. Descriptors beyond
+// the table, or not made by _open, use the kernel's position.
+constexpr int kTracked = 4096;
+int64_t positions[kTracked];
+bool tracked[kTracked];
+
+bool Tracked(int fd) { return fd >= 0 && fd < kTracked && tracked[fd]; }
+
+}  // namespace
+
 int _open(const char* path, int flags, int mode) {
   int f = O_CLOEXEC;
   switch (flags & 3) {
@@ -17,20 +31,42 @@ int _open(const char* path, int flags, int mode) {
   if (flags & kRtCreate) f |= O_CREAT;
   if (flags & kRtTruncate) f |= O_TRUNC;
   if (flags & kRtExclusive) f |= O_EXCL;
-  return ::open(path, f, mode);
+  int fd = ::open(path, f, mode);
+  if (fd >= 0 && fd < kTracked) {
+    tracked[fd] = true;
+    positions[fd] = 0;
+  }
+  return fd;
 }
 
-int _close(int fd) { return ::close(fd); }
+int _close(int fd) {
+  if (fd >= 0 && fd < kTracked) tracked[fd] = false;
+  return ::close(fd);
+}
 
 int32_t _lseek(int fd, int32_t offset, int whence) {
+  if (Tracked(fd) && whence != SEEK_END) {
+    int64_t to = whence == SEEK_CUR ? positions[fd] + offset : int64_t(offset);
+    if (whence != SEEK_SET && whence != SEEK_CUR) return -1;
+    if (to < 0 || to > INT32_MAX) return -1;
+    positions[fd] = to;
+    return int32_t(to);
+  }
   off_t r = ::lseek(fd, offset, whence);
   if (r < 0 || r > INT32_MAX) return -1;
+  if (Tracked(fd)) positions[fd] = r;
   return int32_t(r);
 }
 
 int32_t _read(int fd, void* buffer, uint32_t count) {
   if (count > INT32_MAX) count = INT32_MAX;
   ssize_t n;
+  if (Tracked(fd)) {
+    do n = ::pread(fd, buffer, count, off_t(positions[fd]));
+    while (n < 0 && errno == EINTR);
+    if (n > 0) positions[fd] += n;
+    return int32_t(n);
+  }
   do n = ::read(fd, buffer, count);
   while (n < 0 && errno == EINTR);
   return int32_t(n);
@@ -39,6 +75,12 @@ int32_t _read(int fd, void* buffer, uint32_t count) {
 int32_t _write(int fd, const void* buffer, uint32_t count) {
   if (count > INT32_MAX) count = INT32_MAX;
   ssize_t n;
+  if (Tracked(fd)) {
+    do n = ::pwrite(fd, buffer, count, off_t(positions[fd]));
+    while (n < 0 && errno == EINTR);
+    if (n > 0) positions[fd] += n;
+    return int32_t(n);
+  }
   do n = ::write(fd, buffer, count);
   while (n < 0 && errno == EINTR);
   return int32_t(n);

@@ -7,12 +7,14 @@
 #include <climits>
 #include <ctime>
 
+#include "host/filecache.h"
+
 namespace {
 
 // The file position of each descriptor that _open made, kept here so that a
-// seek costs no system call and a read or write is one pread or pwrite: the
-// index code seeks before every block it reads or writes. Descriptors beyond
-// the table, or not made by _open, use the kernel's position.
+// seek costs no system call: the index code seeks before every block it reads
+// or writes. Their reads and writes go through the page cache. Descriptors
+// beyond the table, or not made by _open, use the kernel's position.
 constexpr int kTracked = 4096;
 int64_t positions[kTracked];
 bool tracked[kTracked];
@@ -33,15 +35,21 @@ int _open(const char* path, int flags, int mode) {
   if (flags & kRtExclusive) f |= O_EXCL;
   int fd = ::open(path, f, mode);
   if (fd >= 0 && fd < kTracked) {
-    tracked[fd] = true;
+    filecache::Attach(fd, (flags & kRtTruncate) != 0);
+    tracked[fd] = filecache::Attached(fd);
     positions[fd] = 0;
   }
   return fd;
 }
 
 int _close(int fd) {
-  if (fd >= 0 && fd < kTracked) tracked[fd] = false;
-  return ::close(fd);
+  bool written = true;
+  if (Tracked(fd)) {
+    tracked[fd] = false;
+    written = filecache::Detach(fd);
+  }
+  int r = ::close(fd);
+  return written ? r : -1;
 }
 
 int32_t _lseek(int fd, int32_t offset, int whence) {
@@ -52,9 +60,14 @@ int32_t _lseek(int fd, int32_t offset, int whence) {
     positions[fd] = to;
     return int32_t(to);
   }
+  if (Tracked(fd)) {
+    int64_t end = filecache::Size(fd) + offset;
+    if (end < 0 || end > INT32_MAX) return -1;
+    positions[fd] = end;
+    return int32_t(end);
+  }
   off_t r = ::lseek(fd, offset, whence);
   if (r < 0 || r > INT32_MAX) return -1;
-  if (Tracked(fd)) positions[fd] = r;
   return int32_t(r);
 }
 
@@ -62,8 +75,7 @@ int32_t _read(int fd, void* buffer, uint32_t count) {
   if (count > INT32_MAX) count = INT32_MAX;
   ssize_t n;
   if (Tracked(fd)) {
-    do n = ::pread(fd, buffer, count, off_t(positions[fd]));
-    while (n < 0 && errno == EINTR);
+    n = filecache::Read(fd, buffer, count, positions[fd]);
     if (n > 0) positions[fd] += n;
     return int32_t(n);
   }
@@ -76,8 +88,7 @@ int32_t _write(int fd, const void* buffer, uint32_t count) {
   if (count > INT32_MAX) count = INT32_MAX;
   ssize_t n;
   if (Tracked(fd)) {
-    do n = ::pwrite(fd, buffer, count, off_t(positions[fd]));
-    while (n < 0 && errno == EINTR);
+    n = filecache::Write(fd, buffer, count, positions[fd]);
     if (n > 0) positions[fd] += n;
     return int32_t(n);
   }

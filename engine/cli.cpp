@@ -116,13 +116,13 @@ int ParseArgs(int argc, char** argv, Args* args) {
       if (!take(&v)) return Usage("--format needs a value");
       if (!ParseFormat(v, &args->format)) return Usage("--format takes csv, jsonl or table, not " + v);
     } else if (a == "--to") {
-      if (!take(&args->convert.to) || args->convert.to.empty()) return Usage("--to needs a value");
+      if (!take(&args->convert.write.table.dialect) || args->convert.write.table.dialect.empty()) return Usage("--to needs a value");
     } else if (a == "--mode") {
       std::string v;
       if (!take(&v)) return Usage("--mode needs a value");
-      if (v == "replace") args->convert.mode = 0;
-      else if (v == "append") args->convert.mode = 1;
-      else if (v == "update") args->convert.mode = 2;
+      if (v == "replace") args->convert.write.mode = 0;
+      else if (v == "append") args->convert.write.mode = 1;
+      else if (v == "update") args->convert.write.mode = 2;
       else return Usage("--mode takes replace, append or update, not " + v);
     } else if (a == "--key") {
       std::string v;
@@ -137,7 +137,7 @@ int ParseArgs(int argc, char** argv, Args* args) {
         start = comma + 1;
       }
     } else if (a == "--schema") {
-      if (!take(&args->convert.schema)) return Usage("--schema needs a value");
+      if (!take(&args->convert.read.schema)) return Usage("--schema needs a value");
     } else if (a == "--no-progress") {
       args->convert.progress = false;
     } else if (a.rfind("--", 0) == 0 && a.size() > 2) {
@@ -155,9 +155,12 @@ int ParseArgs(int argc, char** argv, Args* args) {
   return 0;
 }
 
+// Opens the one table of `info` and `cat`.
 int OpenOrFail(const Args& args, SourcePtr* spoke) {
+  ReadOptions read;
+  read.table = args.source;
   std::string error;
-  if (OpenSource(args.files[0], args.source, spoke, &error) != 0) return Fail(error);
+  if (!FindEndpoint("dbf")->open_source(args.files[0], read, spoke, &error)) return Fail(error);
   return 0;
 }
 
@@ -275,11 +278,15 @@ int CmdCat(const Args& args) {
   return 0;
 }
 
-int CmdConvert(Args& args) {
+int CmdConvert(const Args& args) {
   if (args.files.size() != 2) return Usage("convert takes a source and a target");
-  if (args.convert.mode != 2 && !args.convert.key.empty()) return Usage("--key goes with --mode update");
-  args.convert.source = args.source;
-  return RunConvert(args.files[0], args.files[1], args.convert);
+  if (args.convert.write.mode != 2 && !args.convert.key.empty()) return Usage("--key goes with --mode update");
+  ConvertOptions opts = args.convert;
+  opts.read.table = args.source;
+  opts.write.table.type = args.source.type;
+  opts.write.table.codepage = args.source.codepage;
+  opts.write.table.memo_policy = args.source.memo_policy;
+  return RunConvert(args.files[0], args.files[1], opts);
 }
 
 void QuietSink(void*, int, BATCHERR, const char*) {
@@ -299,11 +306,11 @@ int ZqdbMain(int argc, char** argv) {
   if (args.command == "formats") return CmdFormats(args);
   // Dialect names are checked before any file is touched: a wrong one is a
   // usage error.
-  if (!args.source.dialect.empty() || !args.convert.to.empty()) {
+  if (!args.source.dialect.empty() || !args.convert.write.table.dialect.empty()) {
     TableConnector c;
     std::string error;
     if (!ResolveConnector(args.source.type, &c, &error)) return Fail(error);
-    for (const std::string* v : {&args.source.dialect, &args.convert.to}) {
+    for (const std::string* v : {&args.source.dialect, &args.convert.write.table.dialect}) {
       SourcePtr probe = NewTableSource(c);
       if (!v->empty() && (!probe || !ApplyDialect(probe.get(), *v))) return Usage("unknown dialect: " + *v);
     }

@@ -6,6 +6,7 @@
 #include <cstdlib>
 #include <cstring>
 
+#include "engine/endpoints.h"
 #include "engine/text_types.h"
 #include "host/zqdate.h"
 #include "host/zqutil.h"
@@ -373,4 +374,42 @@ BATCHERR ZQFromCsv::GetRecord(int32_t n) {
     ++next_;
   }
   return AssignRow();
+}
+
+namespace {
+
+void DeleteCsv(ZQImport* s) { delete s; }
+
+// Column types from the fields of the table the records go to.
+std::vector<SchemaField> HintsOf(ZQRecord& layout) {
+  std::vector<SchemaField> hints;
+  for (int i = 0; i < layout.FieldCount(); ++i) {
+    ZQField* f = layout[i];
+    char letter = char(f->DataType().Usage());
+    if (letter == 'G' || (letter == 'B' && f->FieldType() != FT_FLOAT)) letter = 'M';
+    if (strchr("CNFDLMIYBT", letter) == nullptr || letter == 0) letter = 'C';
+    int length = letter == 'C' || letter == 'N' || letter == 'F' ? f->Length() : 0;
+    hints.push_back(SchemaField{f->Name(), letter, length, f->DecLen()});
+  }
+  return hints;
+}
+
+}  // namespace
+
+bool OpenCsvSource(const std::string& path, const ReadOptions& opts, SourcePtr* out, std::string* error) {
+  SourcePtr csv(new ZQFromCsv(), SourceDeleter{DeleteCsv});
+  auto* source = static_cast<ZQFromCsv*>(csv.get());
+  if (!opts.schema.empty()) {
+    std::vector<SchemaField> schema;
+    if (!ParseSchema(opts.schema, &schema, error)) return false;
+    source->SetSchema(schema);
+  }
+  ZQRecord layout;
+  if (opts.into && opts.into(&layout)) source->SetTypeHints(HintsOf(layout));
+  ZQConnTarget t;
+  t.path = path.c_str();
+  source->SetUserInfo(t);
+  if (source->MakeFields() != 0) return *error = source->LastErrorMessage(), false;
+  *out = std::move(csv);
+  return true;
 }

@@ -4,6 +4,7 @@
 #include <cstdio>
 #include <cstdlib>
 
+#include "engine/endpoints.h"
 #include "host/zqutil.h"
 
 namespace {
@@ -163,4 +164,8 @@ BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePt
   }
   *out = std::move(spoke);
   return 0;
+}
+
+bool OpenTableSource(const std::string& path, const ReadOptions& opts, SourcePtr* out, std::string* error) {
+  return OpenSource(path, opts.table, out, error) == 0;
 }

@@ -4,10 +4,10 @@
 // definitions, as the integration engine applies them.
 #pragma once
 
-#include <memory>
 #include <string>
 
 #include "engine/modules.h"
+#include "engine/spoke_ptr.h"
 #include "host/zqspoke.h"
 
 struct SourceOptions {
@@ -16,21 +16,6 @@ struct SourceOptions {
   int codepage = 0;
   int memo_policy = 0;  // 0 never, 1 errors, 2 always ignore the memo file
 };
-
-struct SourceDeleter {
-  void (*del)(ZQImport*) = nullptr;
-  void operator()(ZQImport* s) const {
-    if (s != nullptr) del(s);
-  }
-};
-struct TargetDeleter {
-  void (*del)(ZQExport*) = nullptr;
-  void operator()(ZQExport* s) const {
-    if (s != nullptr) del(s);
-  }
-};
-using SourcePtr = std::unique_ptr<ZQImport, SourceDeleter>;
-using TargetPtr = std::unique_ptr<ZQExport, TargetDeleter>;
 
 // A definition and its loaded factories.
 struct TableConnector {

@@ -9,12 +9,12 @@
 #include <cstring>
 
 bool VerifyTable(const std::string& path, const TableConnector& c, const std::string& dialect,
-                 const ConvertOptions& opts, int64_t expected, std::string* message) {
+                 const TableWriteOptions& opts, int64_t expected, std::string* message) {
   SourcePtr check = NewTableSource(c);
   if (!check) return *message = "out of memory", false;
   ApplyDialect(check.get(), dialect);
-  check->SetOption("codepage", std::to_string(opts.source.codepage).c_str());
-  check->SetOption("ignorememoerr", std::to_string(opts.source.memo_policy).c_str());
+  check->SetOption("codepage", std::to_string(opts.codepage).c_str());
+  check->SetOption("ignorememoerr", std::to_string(opts.memo_policy).c_str());
   ZQConnTarget t;
   t.path = path.c_str();
   BATCHERR rc = check->SetUserInfo(t);

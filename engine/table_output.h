@@ -6,14 +6,14 @@
 #include <string>
 #include <vector>
 
-#include "engine/convert.h"
+#include "engine/endpoints.h"
 
 // Reopens a table just written and checks that it holds `expected` records
 // and that the last of them reads: a write that failed only when the last
 // buffered bytes reached the disk (a full disk, a file size limit) shows
 // here, since closing a table reports nothing.
 bool VerifyTable(const std::string& path, const TableConnector& c, const std::string& dialect,
-                 const ConvertOptions& opts, int64_t expected, std::string* message);
+                 const TableWriteOptions& opts, int64_t expected, std::string* message);
 
 // A replaced table is built in a scratch directory beside the target and
 // moved into place when it is whole, so that a failed run leaves the old

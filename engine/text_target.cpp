@@ -7,6 +7,7 @@
 #include <cstdio>
 #include <cstring>
 
+#include "engine/endpoints.h"
 #include "engine/text_types.h"
 
 ZQToText::ZQToText(OutputFormat format) : ZQExport(ZQSpokeDef{}, nullptr, false), format_(format) {
@@ -50,4 +51,29 @@ BATCHERR ZQToText::_CloseOutput(bool keep) {
   unlink(temp_path_.c_str());
   if (keep) return LogError(4, ZQ_WRITE_ERROR, "cannot write %s", final_path_.c_str());
   return 0;
+}
+
+namespace {
+
+void DeleteText(ZQExport* s) { delete s; }
+
+std::unique_ptr<Target> MakeTextTarget(OutputFormat format, const std::string& path, const WriteOptions& opts,
+                                       std::string* error) {
+  if (opts.mode != 0) {
+    *error = "append and update modes need a table as the target";
+    return nullptr;
+  }
+  return std::make_unique<Target>(TargetPtr(new ZQToText(format), TargetDeleter{DeleteText}), path);
+}
+
+}  // namespace
+
+std::unique_ptr<Target> MakeCsvTarget(const std::string& path, const WriteOptions& opts, ZQImport*,
+                                      std::string* error) {
+  return MakeTextTarget(OutputFormat::kCsv, path, opts, error);
+}
+
+std::unique_ptr<Target> MakeJsonlTarget(const std::string& path, const WriteOptions& opts, ZQImport*,
+                                        std::string* error) {
+  return MakeTextTarget(OutputFormat::kJsonl, path, opts, error);
 }

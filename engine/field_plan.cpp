@@ -1,0 +1,128 @@
+#include "engine/field_plan.h"
+
+#include <algorithm>
+
+#include "engine/convert_layout.h"
+#include "engine/report.h"
+#include "engine/text_util.h"
+
+bool FieldPlan::Make(ZQRecord& in, ZQExport* target, const std::string& path, bool existing, std::string* error) {
+  in_ = &in;
+  out_ = target->GetLayout(0);
+  out_->ClearFields();
+  routes_.clear();
+  if (existing) {
+    ZQConnTarget t;
+    t.path = path.c_str();
+    if (target->MakeFields(*out_, t) != 0) {
+      std::string message = target->LastErrorMessage();
+      *error = message.empty() ? "cannot read the layout of " + path : message;
+      return false;
+    }
+    Match(target);
+  } else if (!Plan(target, error)) {
+    return false;
+  }
+  int bad_field = -1;
+  if (target->ValidateLocalRecord(*out_, bad_field) != 0) {
+    *error = std::string("records are too long for the target from field ") +
+             (bad_field >= 0 && bad_field < out_->FieldCount() ? (*out_)[bad_field]->Name() : "?") + " on";
+    return false;
+  }
+  return true;
+}
+
+// Each field of the existing layout takes the first unused source field of
+// its name, or of the name the target would give it.
+void FieldPlan::Match(ZQExport* target) {
+  ZQRecord& in = *in_;
+  ZQRecord& out = *out_;
+  std::vector<bool> used(size_t(in.FieldCount()), false);
+  for (int j = 0; j < out.FieldCount(); ++j) {
+    ZQField* f = out[j];
+    target->FormatSpokeField(f, nullptr);
+    int match = -1;
+    for (int i = 0; i < in.FieldCount() && match < 0; ++i)
+      if (!used[size_t(i)] && (Lower(in[i]->Name()) == Lower(f->Name()) ||
+                               Lower(TargetName(target, in[i]->Name(), {})) == Lower(f->Name())))
+        match = i;
+    if (match < 0) Warn(std::string("field ") + f->Name() + " of the table has no source field: left blank");
+    else used[size_t(match)] = true;
+    routes_.push_back(FieldRoute{match, f->Name(), FieldCheck{char(f->DataType().Usage()), f->Length()}});
+  }
+  for (int i = 0; i < in.FieldCount(); ++i)
+    if (!used[size_t(i)]) Warn(std::string("field ") + in[i]->Name() + " is left out: the table has no such field");
+}
+
+// A new layout: each source field in a name and the nearest type the target
+// has, as many as the target keeps.
+bool FieldPlan::Plan(ZQExport* target, std::string* error) {
+  ZQRecord& in = *in_;
+  int cap = std::min(target->MaxFieldCount(), target->MaxNewFieldCount());
+  std::vector<std::string> names;
+  for (int i = 0; i < in.FieldCount(); ++i) {
+    ZQField* s = in[i];
+    if (int(routes_.size()) == cap) {
+      Warn(std::string("field ") + s->Name() + " and those behind it are left out: the target keeps " +
+           std::to_string(cap) + " fields");
+      break;
+    }
+    Planned plan;
+    if (!PlanType(target, s, &plan)) {
+      Warn(std::string("field ") + s->Name() + " is left out: the target has no type for it");
+      continue;
+    }
+    std::string name = TargetName(target, s->Name(), names);
+    if (name != s->Name()) Warn(std::string("field ") + s->Name() + " is named " + name + " in the target");
+    if (!plan.change.empty()) Warn(std::string("field ") + s->Name() + ": " + plan.change);
+    ZQField* f = out_->NewField(plan.type, name.c_str());
+    if (f == nullptr) return *error = "out of memory", false;
+    target->FormatSpokeField(f, s);
+    names.push_back(name);
+    routes_.push_back(FieldRoute{i, name, FieldCheck{char(plan.type.Usage()), f->Length()}});
+  }
+  return true;
+}
+
+bool FieldPlan::FindKey(const std::vector<std::string>& names, std::vector<int>* key, std::string* error) const {
+  for (const std::string& k : names) {
+    int found = -1;
+    for (size_t i = 0; i < routes_.size(); ++i) {
+      int from = routes_[i].from;
+      if ((from >= 0 && Lower((*in_)[from]->Name()) == Lower(k)) || Lower(routes_[i].name) == Lower(k))
+        found = int(i);
+    }
+    if (found < 0) return *error = "--key names no field: " + k, false;
+    key->push_back(found);
+  }
+  return true;
+}
+
+bool FieldPlan::Fill(int32_t n, std::string* error) {
+  ZQRecord& in = *in_;
+  ZQRecord& out = *out_;
+  for (size_t i = 0; i < routes_.size(); ++i) {
+    FieldRoute& r = routes_[i];
+    if (r.from < 0) {
+      out[int(i)]->Blank();
+    } else if (!CopyValue(out[int(i)], in[r.from], &r.check)) {
+      const ZQString& v = in[r.from]->StringRef();
+      *error = "record " + std::to_string(n + 1) + ", field " + r.name + ": \"" +
+               std::string(v.c_str(), size_t(v.length() < 40 ? v.length() : 40)) + "\" doesn't fit a " +
+               std::string(1, r.check.letter) + " field";
+      return false;
+    }
+  }
+  return true;
+}
+
+void FieldPlan::WarnLosses(bool keeps_blank_logicals) const {
+  for (const FieldRoute& r : routes_)
+    if (r.check.cut > 0)
+      Warn(std::string("field ") + r.name + ": " + std::to_string(r.check.cut) + " values longer than " +
+           std::to_string(r.check.width) + " bytes were cut");
+  for (const FieldRoute& r : routes_)
+    if (r.check.blank_logicals > 0 && !keeps_blank_logicals)
+      Warn(std::string("field ") + r.name + ": " + std::to_string(r.check.blank_logicals) +
+           " blank logicals were written as F");
+}

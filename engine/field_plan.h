@@ -1,0 +1,52 @@
+// The field plan of a transfer: which source field feeds each target field,
+// and the check of each value on its way (convert_values.h). The target's
+// layout is made with it: a new one from the source's fields, in names and
+// types the target accepts (convert_layout.h), or an existing table's own,
+// fed by the source fields of the same names.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "engine/convert_values.h"
+#include "host/zqspoke.h"
+
+// One target field.
+struct FieldRoute {
+  int from;           // the source field that feeds it; -1: left blank
+  std::string name;   // the target field's name
+  FieldCheck check;   // its type letter and width, and what its values lost
+};
+
+class FieldPlan {
+ public:
+  // Lays out layout 0 of `target` for the records of `in`: with `existing`,
+  // the fields of the file `path` (records added to it), else fields made
+  // from the source's. Each change on the way (a name changed, a type
+  // mapped, a field left out) is warned of. False with `error` set.
+  bool Make(ZQRecord& in, ZQExport* target, const std::string& path, bool existing, std::string* error);
+
+  // The target fields named by `names` (by a source or a target field's
+  // name), for update mode's key. False with `error` set.
+  bool FindKey(const std::vector<std::string>& names, std::vector<int>* key, std::string* error) const;
+
+  // Fills the target's record from the source's current one. False when a
+  // value doesn't fit its target field, with `error` naming record `n`
+  // (0-based), the field and the value.
+  bool Fill(int32_t n, std::string* error);
+
+  // Warns of the values changed on the way: text cut to its field, and
+  // blank logicals written as F when the target keeps no blank.
+  void WarnLosses(bool keeps_blank_logicals) const;
+
+  ZQRecord& out() const { return *out_; }
+
+ private:
+  void Match(ZQExport* target);
+  bool Plan(ZQExport* target, std::string* error);
+
+  ZQRecord* in_ = nullptr;
+  ZQRecord* out_ = nullptr;
+  std::vector<FieldRoute> routes_;
+};

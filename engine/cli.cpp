@@ -14,23 +14,17 @@
 #include "engine/dbf_source.h"
 #include "engine/modules.h"
 #include "engine/outbuf.h"
+#include "engine/report.h"
 #include "engine/writers.h"
 #include "host/zqglob.h"
 #include "host/zqutil.h"
 
 namespace {
 
-constexpr int kExitError = 1;
 constexpr int kExitUsage = 2;
 
-const char kUsage[] =
-    "usage: zqdb COMMAND [options] FILE...\n"
-    "\n"
-    "commands:\n"
-    "  info TABLE               dialect, version byte, record counts and fields\n"
-    "  cat TABLE                the live records (--format csv|jsonl|table)\n"
-    "  convert SRC DST          records from a table or CSV file to a table, CSV or JSON-lines file\n"
-    "  formats                  the connector definitions of the modules found\n"
+// The usage after the list of commands.
+const char kOptionsUsage[] =
     "\n"
     "options (before or after the file names):\n"
     "  --dialect D              0-10 or a name: \"dBASE IV\", foxpro, clipper, ...\n"
@@ -59,10 +53,7 @@ int Usage(const std::string& message) {
   return kExitUsage;
 }
 
-int Fail(const std::string& message) {
-  fprintf(stderr, "zqdb: %s\n", message.c_str());
-  return kExitError;
-}
+void PrintUsage(FILE* out);
 
 // Parses the command line; 0, or the exit status of a usage error.
 int ParseArgs(int argc, char** argv, Args* args) {
@@ -86,7 +77,7 @@ int ParseArgs(int argc, char** argv, Args* args) {
       return true;
     };
     if (a == "--help" || a == "-h") {
-      fputs(kUsage, stdout);
+      PrintUsage(stdout);
       exit(0);
     } else if (a == "--dialect") {
       if (!take(&args->source.dialect) || args->source.dialect.empty()) return Usage("--dialect needs a value");
@@ -149,7 +140,7 @@ int ParseArgs(int argc, char** argv, Args* args) {
     }
   }
   if (args->command.empty()) {
-    fputs(kUsage, stderr);
+    PrintUsage(stderr);
     return kExitUsage;
   }
   return 0;
@@ -289,6 +280,57 @@ int CmdConvert(const Args& args) {
   return RunConvert(args.files[0], args.files[1], opts);
 }
 
+// The commands. A new one is a function and a row.
+struct Command {
+  const char* name;
+  const char* synopsis;  // its line in the usage: synopsis, then summary
+  const char* summary;
+  int (*run)(const Args& args);
+  bool reads_tables;     // the module scan's warnings, and the dialect names, first
+};
+
+const Command kCommands[] = {
+    {"info", "info TABLE", "dialect, version byte, record counts and fields", CmdInfo, true},
+    {"cat", "cat TABLE", "the live records (--format csv|jsonl|table)", CmdCat, true},
+    {"convert", "convert SRC DST", "records from a table or CSV file to a table, CSV or JSON-lines file", CmdConvert,
+     true},
+    {"formats", "formats", "the connector definitions of the modules found", CmdFormats, false},
+};
+
+const Command* FindCommand(const std::string& name) {
+  for (const Command& c : kCommands)
+    if (name == c.name) return &c;
+  return nullptr;
+}
+
+void PrintUsage(FILE* out) {
+  fputs("usage: zqdb COMMAND [options] FILE...\n\ncommands:\n", out);
+  for (const Command& c : kCommands) fprintf(out, "  %-25s%s\n", c.synopsis, c.summary);
+  fputs(kOptionsUsage, out);
+}
+
+// What every command that reads tables checks first: the warnings of the
+// module scan, once, and the dialect names, before any file is touched (a
+// wrong one is a usage error). 0, or the exit status.
+int CheckTableOptions(const Args& args) {
+  for (const std::string& w : ModuleRegistry::Get().Warnings()) fprintf(stderr, "zqdb: warning: %s\n", w.c_str());
+  const std::string& to = args.convert.write.table.dialect;
+  if (!args.source.dialect.empty() || !to.empty()) {
+    TableConnector c;
+    std::string error;
+    if (!ResolveConnector(args.source.type, &c, &error)) return Fail(error);
+    for (const std::string* v : {&args.source.dialect, &to}) {
+      SourcePtr probe = NewTableSource(c);
+      if (!v->empty() && (!probe || !ApplyDialect(probe.get(), *v))) return Usage("unknown dialect: " + *v);
+    }
+  } else if (!args.source.type.empty()) {
+    TableConnector c;
+    std::string error;
+    if (!ResolveConnector(args.source.type, &c, &error)) return Usage(error);
+  }
+  return 0;
+}
+
 void QuietSink(void*, int, BATCHERR, const char*) {
   // Messages come back through the spokes' last error and are reported once
   // by the command that failed.
@@ -300,27 +342,10 @@ int ZqdbMain(int argc, char** argv) {
   SetLogSink(QuietSink, nullptr);
   Args args;
   if (int rc = ParseArgs(argc, argv, &args)) return rc;
-  // Warnings of the module scan, once, for the commands that use a module.
-  if (args.command != "formats")
-    for (const std::string& w : ModuleRegistry::Get().Warnings()) fprintf(stderr, "zqdb: warning: %s\n", w.c_str());
-  if (args.command == "formats") return CmdFormats(args);
-  // Dialect names are checked before any file is touched: a wrong one is a
-  // usage error.
-  if (!args.source.dialect.empty() || !args.convert.write.table.dialect.empty()) {
-    TableConnector c;
-    std::string error;
-    if (!ResolveConnector(args.source.type, &c, &error)) return Fail(error);
-    for (const std::string* v : {&args.source.dialect, &args.convert.write.table.dialect}) {
-      SourcePtr probe = NewTableSource(c);
-      if (!v->empty() && (!probe || !ApplyDialect(probe.get(), *v))) return Usage("unknown dialect: " + *v);
-    }
-  } else if (!args.source.type.empty()) {
-    TableConnector c;
-    std::string error;
-    if (!ResolveConnector(args.source.type, &c, &error)) return Usage(error);
-  }
-  if (args.command == "info") return CmdInfo(args);
-  if (args.command == "cat") return CmdCat(args);
-  if (args.command == "convert") return CmdConvert(args);
-  return Usage("unknown command " + args.command);
+  const Command* command = FindCommand(args.command);
+  // An unknown command is told after those checks, as it always was.
+  if (command == nullptr || command->reads_tables)
+    if (int rc = CheckTableOptions(args)) return rc;
+  if (command == nullptr) return Usage("unknown command " + args.command);
+  return command->run(args);
 }

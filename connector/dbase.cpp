@@ -15,7 +15,10 @@ ZQDbase::ZQDbase(ZQSpoke* spoke) : ZQDbaseOptions(spoke, DIALECT_DBASE4) {
   BinaryLong.MSBFirst(false);
 }
 
-ZQDbase::~ZQDbase() { ZQGlob::freebuf(RecordBuffer); }
+ZQDbase::~ZQDbase() {
+  ZQGlob::freebuf(RecordBuffer);
+  DropIndexes();
+}
 
 BATCHERR ZQDbase::DBOpenFile(const char* name, bool writable) {
   size_t n = strlen(name);
@@ -285,10 +288,4 @@ BATCHERR ZQDbase::GetMemoField(ZQField* field, const ZQString& pointer, bool wit
     field->SetFieldInfo(new ZQMemoBlockNumber(block, uint32_t(MemoText.length())));
   }
   return 0;
-}
-
-void ZQDbase::DescribeIndices(const char* name) {
-  // FoxPro tables list the tags of their CDX file, dBASE IV and Visual dBASE
-  // tables those of their MDX file; the index readers hook in here.
-  (void)name;
 }

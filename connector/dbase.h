@@ -48,6 +48,12 @@ class ZQ_EXPORT ZQDbaseOptions : public ZQSpokeOptions {
   const ZQDType** IndexTypes = nullptr;  // 5 entries, NULL-ended
 };
 
+// Which index classes serve a dialect: MDX tags and NDX files for dBASE IV,
+// the unnamed dialect and Visual dBASE 5.5; CDX tags and IDX files for FoxPro
+// and Visual FoxPro; none for the others.
+enum class IndexFamily { kNone, kDbase, kFox };
+ZQ_EXPORT IndexFamily IndexFamilyOf(int dialect);
+
 // One row of the name table of the saved text form.
 struct VersionName {
   int dialect;
@@ -90,6 +96,12 @@ class ZQ_EXPORT ZQDbase : public ZQDbaseOptions {
   bool IsMemoType(int type) const;
   BATCHERR GetMemoField(ZQField* field, const ZQString& pointer, bool withInfo);
   void DescribeIndices(const char* name);
+  // Opens the index `name` (a tag, or an index file's path) of the table
+  // whose path without extension is `base`, by the dialect's index classes.
+  // NULL when the dialect has none or memory runs out; test OK() else.
+  ZQDBIndexBase* OpenIndex(const char* base, const char* name);
+  // Deletes the selected index and the CDX tag list.
+  void DropIndexes();
   ZQSpoke* OwnerSpoke() const { return Spoke(); }
 
   ZQDBFILE* Table = nullptr;

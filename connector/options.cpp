@@ -5,6 +5,7 @@
 #include <new>
 
 #include "connector/dbase.h"
+#include "index/dbindex.h"
 #include "host/zqutil.h"
 
 namespace {
@@ -226,10 +227,17 @@ BATCHERR ZQDbase::SetOptions(const ZQSpokeOptions* opts) {
   if (order == OrderNumber) return 0;
   // Selecting an index: forget the open one, then open the new one.
   OrderNumber = order;
-  OrderIndex = nullptr;  // index objects come with the index layer
+  delete OrderIndex;
+  OrderIndex = nullptr;
   if (order == 0) return 0;
-  // No dialect opens an index object yet, so a selection can't be honoured.
-  return ZQ_INDEX_ERROR;
+  // A number that names no entry of the list is an index that can't be opened.
+  ZQIndexDef* const* list = Spoke() != nullptr ? Spoke()->IndexList() : nullptr;
+  int count = 0;
+  while (list != nullptr && list[count] != nullptr) ++count;
+  if (order < 0 || order > count) return ZQ_INDEX_ERROR;
+  OrderIndex = OpenIndex(BasePath, list[order - 1]->Name());
+  if (OrderIndex == nullptr || !OrderIndex->OK()) return ZQ_INDEX_ERROR;
+  return 0;
 }
 
 void ZQDbase::SaveOptions(ZQString& text, bool noIndex) const {

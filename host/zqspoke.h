@@ -174,6 +174,24 @@ class ZQIndexDef {
   ZQIndexSeg segs_[kMaxSegs];
 };
 
+// This engine's own addition: one index of an open connection, walked in key
+// order. Each step gives the record number (from 0) of the key it stands on
+// and puts the key's bytes in `key`; -1 at either end, and on damage.
+class ZQIndexWalk {
+ public:
+  virtual ~ZQIndexWalk() = default;
+  virtual int32_t First(ZQString& key) = 0;
+  virtual int32_t Next(ZQString& key) = 0;
+  // Walking backwards; only where Backwards() says the index kind can.
+  virtual bool Backwards() const = 0;
+  virtual int32_t Last(ZQString& key) = 0;
+  virtual int32_t Prev(ZQString& key) = 0;
+  // Goes to the first key not less than `key`.
+  virtual int32_t Seek(const ZQString& key, ZQString& found) = 0;
+  // The key expression as the index file holds it.
+  virtual const char* Expression() const = 0;
+};
+
 // The base of every spoke.
 class ZQSpoke {
  public:
@@ -219,6 +237,14 @@ class ZQSpoke {
   // connection (file format, counts, companion files) for reports. Nothing by
   // default.
   virtual void ReportFacts(ZQString& text) const { (void)text; }
+  // This engine's own addition: compiles an index expression over layout 0
+  // into `def` by the connector's own grammar. False when the connector has
+  // no indexes or doesn't understand the expression.
+  virtual bool ParseIndexExpression(const char* text, ZQIndexDef* def) {
+    (void)text;
+    (void)def;
+    return false;
+  }
 
   ZQRecord* GetLayout(int n) const;
   const ZQDType& TypeByUsage(int16_t usage) const;
@@ -272,6 +298,16 @@ class ZQImport : public ZQSpoke {
   virtual BATCHERR GetRecord(int32_t n) {
     (void)n;
     return ZQ_NOT_SUPPORTED;
+  }
+
+  // This engine's own addition: opens the index `name` (a name of IndexList()
+  // or an index file's path) of the open connection for a walk, and fills
+  // `def` with its definition. NULL when there is no such index or it can't
+  // be opened; the caller deletes the walk.
+  virtual ZQIndexWalk* OpenIndexWalk(const char* name, ZQIndexDef* def) {
+    (void)name;
+    (void)def;
+    return nullptr;
   }
 
   // Called after the target or the options changed, with no table open; the

@@ -100,6 +100,12 @@ class ZQ_EXPORT ZQDbase : public ZQDbaseOptions {
   // whose path without extension is `base`, by the dialect's index classes.
   // NULL when the dialect has none or memory runs out; test OK() else.
   ZQDBIndexBase* OpenIndex(const char* base, const char* name);
+  // Creates the index of `def` over `fields` for the table at `base`.
+  ZQDBIndexBase* CreateIndex(const char* base, const ZQRecord& fields, ZQIndexDef* def);
+  // Opens an index of the open table for a walk in key order; see ZQImport.
+  ZQIndexWalk* OpenIndexWalk(const char* name, ZQIndexDef* def);
+  // "index: name, expression, key type, unique, file" lines for reports.
+  void ReportIndexes(ZQString& text);
   // Deletes the selected index and the CDX tag list.
   void DropIndexes();
   ZQSpoke* OwnerSpoke() const { return Spoke(); }

@@ -28,7 +28,107 @@ ZQDBIndexBase* ZQDbase::OpenIndex(const char* base, const char* name) {
   }
 }
 
+ZQDBIndexBase* ZQDbase::CreateIndex(const char* base, const ZQRecord& fields, ZQIndexDef* def) {
+  switch (IndexFamilyOf(VersionNumber)) {
+    case IndexFamily::kDbase: return new (std::nothrow) ZQDBMdx(base, def->Name(), fields, def);
+    default: return nullptr;
+  }
+}
+
 void ZQDbase::DropIndexes() {
   delete OrderIndex;
   OrderIndex = nullptr;
+}
+
+namespace {
+
+// A walk over one index object, which it owns.
+class IndexObjectWalk : public ZQIndexWalk {
+ public:
+  IndexObjectWalk(ZQDBIndexBase* index, bool backwards, const char* expression)
+      : index_(index), backwards_(backwards), expression_(expression) {}
+  ~IndexObjectWalk() override { delete index_; }
+  int32_t First(ZQString& key) override { return index_->FirstKey(key); }
+  int32_t Next(ZQString& key) override { return index_->NextKey(key); }
+  bool Backwards() const override { return backwards_; }
+  int32_t Last(ZQString& key) override { return backwards_ ? index_->LastKey(key) : -1; }
+  int32_t Prev(ZQString& key) override { return backwards_ ? index_->PrevKey(key) : -1; }
+  int32_t Seek(const ZQString& key, ZQString& found) override {
+    // The search stops in the leaf where the key would go; when every key
+    // there is less, the first key not less is the next one.
+    int32_t r = index_->FindKey(key, false);
+    if (r != -1) r = index_->CurrentKey(found);
+    if (r == -1 || found < key) r = index_->NextKey(found);
+    return r;
+  }
+  const char* Expression() const override { return expression_.c_str(); }
+
+ private:
+  ZQDBIndexBase* index_;
+  bool backwards_;
+  ZQString expression_;
+};
+
+}  // namespace
+
+ZQIndexWalk* ZQDbase::OpenIndexWalk(const char* name, ZQIndexDef* def) {
+  if (Table == nullptr || BasePath[0] == '\0') return nullptr;
+  ZQDBIndexBase* index = OpenIndex(BasePath, name);
+  if (index == nullptr) return nullptr;
+  if (!index->OK()) {
+    delete index;
+    return nullptr;
+  }
+  ZQString expression;
+  bool backwards = true;
+  bool unique = false;
+  if (IndexFamilyOf(VersionNumber) == IndexFamily::kDbase) {
+    auto* mdx = static_cast<ZQDBMdx*>(index);
+    expression = mdx->Expression();
+    backwards = !mdx->IsMdx();  // MDX tags are walked forwards only
+    unique = mdx->Unique();
+  }
+  def->Name(name);
+  def->Dups(!unique);
+  // An expression beyond the grammar still walks; it has no segments then,
+  // and its keys show as text.
+  ZQString parsed(expression);
+  ZQIndexDef compiled;
+  if (ZQDBIndexBase::ParseExpr(parsed, &compiled, OwnerSpoke())) {
+    compiled.Name(name);
+    compiled.Dups(!unique);
+    *def = compiled;
+  }
+  auto* walk = new (std::nothrow) IndexObjectWalk(index, backwards, expression.c_str());
+  if (walk == nullptr) delete index;
+  return walk;
+}
+
+void ZQDbase::ReportIndexes(ZQString& text) {
+  ZQIndexDef* const* list = OwnerSpoke()->IndexList();
+  for (int i = 0; list != nullptr && list[i] != nullptr; ++i) {
+    const ZQIndexDef* def = list[i];
+    ZQString expression;
+    ZQString file(BasePath);
+    if (IndexFamilyOf(VersionNumber) == IndexFamily::kDbase) {
+      file += ".mdx";
+      ZQDBMdx tag(BasePath, def->Name());
+      if (tag.OK()) expression = tag.Expression();
+    }
+    if (expression.length() == 0) ZQDBIndexBase::PrintExpr(expression, const_cast<ZQIndexDef*>(def));
+    // The key type follows from the segments: a single date or numeric
+    // segment makes 8-byte keys of that kind, anything else text.
+    const char* type = "C";
+    if (def->SegCount() == 1 && (*def)[0].Type() != nullptr && (*def)[0].Type()->Kind() != DT_TEXT)
+      type = (*def)[0].IdxField() != nullptr && (*def)[0].IdxField()->FieldType() == FT_DATE ? "D" : "N";
+    text += "index: ";
+    text += def->Name();
+    text += "\t";
+    text += expression;
+    text += "\t";
+    text += type;
+    text += def->Dups() ? "\tduplicates\t" : "\tunique\t";
+    text += file;
+    text += "\n";
+  }
 }

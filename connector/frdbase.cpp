@@ -1,4 +1,5 @@
 #include "connector/frdbase.h"
+#include "index/dbindex.h"
 
 #include <unistd.h>
 
@@ -138,4 +139,11 @@ void ZQFromDbase::ReportFacts(ZQString& text) const {
              unsigned(f->decimals));
     Line(text, "field", buf);
   }
+  dbase.ReportIndexes(text);
+}
+
+bool ZQFromDbase::ParseIndexExpression(const char* text, ZQIndexDef* def) {
+  if (IndexFamilyOf(dbase.GetVersion()) == IndexFamily::kNone) return false;
+  ZQString expression(text);
+  return ZQDBIndexBase::ParseExpr(expression, def, this);
 }

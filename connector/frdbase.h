@@ -34,6 +34,8 @@ class ZQ_EXPORT ZQFromDbase : public ZQImport {
   BATCHERR GetRecord(int32_t n) override;
   // Version byte, header count and lengths, memo file, field descriptors.
   void ReportFacts(ZQString& text) const override;
+  ZQIndexWalk* OpenIndexWalk(const char* name, ZQIndexDef* def) override { return dbase.OpenIndexWalk(name, def); }
+  bool ParseIndexExpression(const char* text, ZQIndexDef* def) override;
 
   // Read-only views for reports (`zqdb info`) and tests.
   const ZQDBFILE* TableHandle() const { return dbase.Table; }

@@ -40,6 +40,7 @@ ZQToDbase::ZQToDbase(const ZQSpokeDef& def) : ZQExport(def, ZQDbase::GetModified
 
 ZQToDbase::~ZQToDbase() {
   if (dbase.Table != nullptr) dbase.CloseFile(nullptr);
+  CloseIndexes();
 }
 
 ZQSpokeOptions* ZQToDbase::NewOptions() const {
@@ -208,8 +209,7 @@ BATCHERR ZQToDbase::DBCreateFile(const char* path, ZQIndexDef* const* indexes) {
   int rc = dbcreat(path, count, dbase.FieldList, version, production);
   free_fields(count);
   if (rc != 0) return ZQ_CREATE_ERROR;
-  // Index objects of the new table hook in here.
-  return 0;
+  return CreateIndexes(path);
 }
 
 bool ZQToDbase::LayoutsMatch() {
@@ -237,13 +237,15 @@ bool ZQToDbase::LayoutsMatch() {
 BATCHERR ZQToDbase::_OpenOutput(const ZQConnTarget& target) {
   inserted_count_ = 0;
   if (mode_ == kUpdate) deleted_count_ = updated_count_ = 0;
-  IndexObjects = nullptr;  // index objects come with the index layer
+  CloseIndexes();
   if (target.path.length() == 0) return ZQ_NO_FILENAME;
   if (dbase.Table != nullptr) dbase.CloseFile(nullptr);
   ZQIndexDef* const* indexes = IndexList();
   const char* path = target.path.c_str();
   if (mode_ == kReplace || !ZQFileProxy::fileExists(path)) {
     if (BATCHERR rc = DBCreateFile(path, indexes); rc != 0) return rc;
+  } else if (BATCHERR rc = OpenIndexes(path); rc != 0) {
+    return rc;
   }
   if (BATCHERR rc = dbase.DBOpenFile(path, true); rc != 0) {
     dbase.CloseFile(nullptr);
@@ -455,7 +457,7 @@ BATCHERR ZQToDbase::GenerateDetailRecord(int layout_number) {
   int rc = physical < 0 ? -1 : dbput(t, buf, physical, 1);
   ++CurrentRecord;
   if (rc != 0) return LogError(4, ZQ_WRITE_ERROR, lgettext(u"Error %d returned from dbput"), rc);
-  // Index keys are added here once the index layer is in.
+  if (BATCHERR ik = AddIndexKeys(); ik != 0) return ik;
   if (mode_ == kUpdate) ++updated_count_;
   else ++inserted_count_;
   return 0;
@@ -787,7 +789,7 @@ BATCHERR ZQToDbase::DeleteRecord(int, const wchar*) { return ZQ_NOT_SUPPORTED; }
 BATCHERR ZQToDbase::_CloseOutput(bool keep) {
   if (!keep && mode_ == kReplace) dbase.CloseFile(&target_);
   else dbase.CloseFile(nullptr);
-  IndexObjects = nullptr;
+  CloseIndexes();
   ZQRecord* layout = GetLayout(0);
   for (int i = 0; i < layout->FieldCount(); ++i) {
     ZQField* f = (*layout)[i];

@@ -44,6 +44,7 @@ class ZQ_EXPORT ZQToDbase : public ZQExport {
   BATCHERR SetFilePosition(int64_t position) override;
   void FieldNameCharSet(ZQString& first, ZQString& second) override;
   BATCHERR ValidateLocalRecord(const ZQRecord& record, int& field) override;
+  bool ParseIndexExpression(const char* text, ZQIndexDef* def) override;
 
   // The number of fields a new table of the current dialect keeps; fields of
   // a layout behind it don't reach the table.
@@ -72,8 +73,17 @@ class ZQ_EXPORT ZQToDbase : public ZQExport {
   // can't hold, so that no value is stored as another one.
   BATCHERR EncodeVfpValue(char* dest, ZQField* field, char letter);
 
+  // The index objects of the host's index list, in its order.
+  BATCHERR OpenIndexes(const char* path);
+  BATCHERR CreateIndexes(const char* path);
+  // One key in every index for the record just written.
+  BATCHERR AddIndexKeys();
+  void CloseIndexes();
+  BATCHERR IndexFailed(const char* what, const ZQIndexDef* def);
+
   mutable ZQDbase dbase{this};
   class ZQDBIndexBase** IndexObjects = nullptr;
+  ZQString IndexKey;
   ZQString MemoScratch;
   int32_t CurrentRecord = 0;
   ZQString FieldScratch;

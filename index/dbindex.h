@@ -49,7 +49,7 @@ class ZQ_EXPORT ZQDBIndexBase {
 
   static const char* GetToken(const char* p, ZQString& token);
   static bool ParseExpr(ZQString& expression, ZQIndexDef* def, ZQSpoke* spoke);
-  void PrintExpr(ZQString& text, ZQIndexDef* def);
+  static void PrintExpr(ZQString& text, ZQIndexDef* def);
   // Bytes of the key that BuildKey makes for `def`: 8 for a date or numeric
   // segment, the field's width for a text one.
   static int32_t KeyFormLength(const ZQIndexDef* def);

@@ -12,6 +12,7 @@
 
 #include "engine/convert.h"
 #include "engine/dbf_source.h"
+#include "engine/indexes.h"
 #include "engine/modules.h"
 #include "engine/outbuf.h"
 #include "engine/report.h"
@@ -37,6 +38,13 @@ const char kOptionsUsage[] =
     "  --mode replace|append|update   convert: make the target anew, add to it, or update it by --key\n"
     "  --key FIELD[,FIELD]      convert --mode update: the fields that identify a record\n"
     "  --schema \"NAME C(30), BORN D, AMOUNT N(12,2), NOTE M\"   convert: column types of a CSV source\n"
+    "  --index NAME=EXPR        convert: make the new table with this index (repeatable); NAME is a tag\n"
+    "                           of the table's MDX or CDX file, or a path ending in .ndx or .idx\n"
+    "  --unique-index NAME=EXPR convert: the same, for an index without duplicates\n"
+    "  --index-form plain       convert: IDX files without compact keys (default compact)\n"
+    "  --index NAME             keys: the index to walk (a tag or an .ndx/.idx path)\n"
+    "  --seek KEY               keys: start at the first key not less than KEY\n"
+    "  --reverse                keys: walk backwards (NDX, IDX, CDX)\n"
     "  --no-progress            convert: no progress line on a terminal\n"
     "  --help                   this text\n";
 
@@ -46,6 +54,7 @@ struct Args {
   SourceOptions source;
   OutputFormat format = OutputFormat::kCsv;
   ConvertOptions convert;
+  KeysOptions keys;
 };
 
 int Usage(const std::string& message) {
@@ -129,6 +138,28 @@ int ParseArgs(int argc, char** argv, Args* args) {
       }
     } else if (a == "--schema") {
       if (!take(&args->convert.read.schema)) return Usage("--schema needs a value");
+    } else if (a == "--index" || a == "--unique-index") {
+      std::string v;
+      if (!take(&v) || v.empty()) return Usage(a + " needs a value");
+      size_t at = v.find('=');
+      if (at == std::string::npos && a == "--index") {
+        args->keys.index = v;
+      } else {
+        if (at == std::string::npos || at == 0 || at + 1 == v.size())
+          return Usage(a + " takes NAME=EXPR, not " + v);
+        args->convert.write.table.indexes.push_back({v.substr(0, at), v.substr(at + 1), a == "--unique-index"});
+      }
+    } else if (a == "--index-form") {
+      std::string v;
+      if (!take(&v)) return Usage("--index-form needs a value");
+      if (v == "plain") args->convert.write.table.plain_idx = true;
+      else if (v == "compact") args->convert.write.table.plain_idx = false;
+      else return Usage("--index-form takes plain or compact, not " + v);
+    } else if (a == "--seek") {
+      if (!take(&args->keys.seek)) return Usage("--seek needs a value");
+      args->keys.has_seek = true;
+    } else if (a == "--reverse") {
+      args->keys.reverse = true;
     } else if (a == "--no-progress") {
       args->convert.progress = false;
     } else if (a.rfind("--", 0) == 0 && a.size() > 2) {
@@ -226,6 +257,22 @@ int CmdInfo(const Args& args) {
     }
     printf("  %-4d %-11s %-4s %5s %4s\n", i + 1, f->Name(), type.c_str(), width.c_str(), dec.c_str());
   }
+  // name, expression, key type, unique or not, file; separated by tabs
+  std::vector<std::vector<std::string>> indexes;
+  for (const auto& f : facts) {
+    if (f.first != "index") continue;
+    std::vector<std::string> parts;
+    size_t start = 0;
+    for (size_t tab; (tab = f.second.find('\t', start)) != std::string::npos; start = tab + 1)
+      parts.push_back(f.second.substr(start, tab - start));
+    parts.push_back(f.second.substr(start));
+    if (parts.size() == 5) indexes.push_back(parts);
+  }
+  printf("indexes:     %zu\n", indexes.size());
+  if (!indexes.empty()) printf("  %-11s %-4s %-10s %-30s %s\n", "name", "type", "duplicates", "expression", "file");
+  for (const auto& x : indexes)
+    printf("  %-11s %-4s %-10s %-30s %s\n", x[0].c_str(), x[2].c_str(), x[3] == "unique" ? "no" : "yes",
+           x[1].c_str(), x[4].c_str());
   spoke->ConnectionClose();
   return 0;
 }
@@ -269,6 +316,19 @@ int CmdCat(const Args& args) {
   return 0;
 }
 
+int CmdKeys(const Args& args) {
+  if (args.files.size() != 1) return Usage("keys takes one table");
+  if (args.keys.index.empty()) return Usage("keys needs --index NAME");
+  if (args.format == OutputFormat::kTable) return Usage("keys writes csv or jsonl");
+  SourcePtr spoke;
+  if (int rc = OpenOrFail(args, &spoke)) return rc;
+  KeysOptions opts = args.keys;
+  opts.jsonl = args.format == OutputFormat::kJsonl;
+  int rc = WriteKeys(spoke.get(), opts);
+  spoke->ConnectionClose();
+  return rc;
+}
+
 int CmdConvert(const Args& args) {
   if (args.files.size() != 2) return Usage("convert takes a source and a target");
   if (args.convert.write.mode != 2 && !args.convert.key.empty()) return Usage("--key goes with --mode update");
@@ -293,6 +353,8 @@ const Command kCommands[] = {
     {"info", "info TABLE", "dialect, version byte, record counts and fields", CmdInfo, true},
     {"cat", "cat TABLE", "the live records (--format csv|jsonl|table)", CmdCat, true},
     {"convert", "convert SRC DST", "records from a table or CSV file to a table, CSV or JSON-lines file", CmdConvert,
+     true},
+    {"keys", "keys TABLE --index NAME", "the keys of an index in key order, with their record numbers", CmdKeys,
      true},
     {"formats", "formats", "the connector definitions of the modules found", CmdFormats, false},
 };
@@ -336,10 +398,17 @@ void QuietSink(void*, int, BATCHERR, const char*) {
   // by the command that failed.
 }
 
+// The module's few console lines go to standard error, so that they never mix
+// with the data a command writes on standard output.
+void ConsoleToStderr(const char* text) {
+  fprintf(stderr, "zqdb: %s", text);
+}
+
 }  // namespace
 
 int ZqdbMain(int argc, char** argv) {
   SetLogSink(QuietSink, nullptr);
+  SetConsoleSink(ConsoleToStderr);
   Args args;
   if (int rc = ParseArgs(argc, argv, &args)) return rc;
   const Command* command = FindCommand(args.command);

@@ -7,6 +7,7 @@
 #include <string>
 
 #include "engine/endpoints.h"
+#include "engine/indexes.h"
 #include "engine/table_output.h"
 
 namespace {
@@ -24,6 +25,7 @@ class TableTarget : public Target {
 
   bool Open(std::string* error) override {
     if (existing_) before_ = CountRecords();
+    if (!AddIndexDefinitions(spoke_.get(), opts_.table, existing_, error)) return false;
     if (opts_.mode == 0 && !staging_.Begin(path_, &work_, error)) return false;
     return Target::Open(error);
   }

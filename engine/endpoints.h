@@ -9,6 +9,7 @@
 #include <functional>
 #include <memory>
 #include <string>
+#include <vector>
 
 #include "engine/dbf_source.h"
 #include "engine/spoke_ptr.h"
@@ -24,6 +25,14 @@ struct ReadOptions {
   std::function<bool(ZQRecord*)> into;
 };
 
+// An index a new table is made with (--index, --unique-index): a tag name,
+// or the path of an index file, and the key expression.
+struct IndexOption {
+  std::string name;
+  std::string expression;
+  bool unique = false;
+};
+
 // What a table target is made with. A new setting of table targets (index
 // definitions, say) is one member here, read by MakeTableTarget
 // (dbf_target.cpp) before the output is opened.
@@ -32,6 +41,8 @@ struct TableWriteOptions {
   std::string dialect;  // --to; "" = the table's own when adding to one, else the source's, else dBASE IV
   int codepage = 0;     // --codepage
   int memo_policy = 0;  // --memo: 0 never, 1 errors, 2 always ignore the memo file
+  std::vector<IndexOption> indexes;  // --index, --unique-index
+  bool plain_idx = false;            // --index-form plain: IDX files without compact keys
 };
 
 // What a target is made with.

@@ -39,10 +39,14 @@ void PutCsvQuoted(OutBuf& out, const char* s, size_t n) {
   out.Put('"');
 }
 
+}  // namespace
+
 void PutCsvText(OutBuf& out, const char* s, size_t n) {
   if (bytescan::HasCsvSpecial(s, n)) PutCsvQuoted(out, s, n);
   else out.Put(s, n);
 }
+
+namespace {
 
 // A value held in a ZQString: its buffer always has room for 16 bytes, so
 // short values are tested with a single load.

@@ -22,6 +22,8 @@ class RecordWriter {
 
 std::unique_ptr<RecordWriter> MakeWriter(OutputFormat format, OutBuf& out);
 
+// Writes `s` as a CSV field, quoted where it must be.
+void PutCsvText(OutBuf& out, const char* s, size_t n);
 // Writes `s` as a JSON string literal. Bytes that are not UTF-8 are taken as
 // Latin-1 characters, so the output is always valid JSON.
 void PutJsonString(OutBuf& out, const char* s, size_t n);

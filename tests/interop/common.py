@@ -50,6 +50,8 @@ def zqdb_fields(table, *opts):
             in_list = True
             continue
         if in_list:
+            if not line.startswith("  "):
+                break  # the index list behind the fields
             num, name, letter, width, dec = line.split()
             fields.append((name, letter, int(width), int(dec)))
     return fields

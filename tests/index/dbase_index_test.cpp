@@ -1,0 +1,419 @@
+// The index core and the dBASE indexes (NDX files, MDX tags): expressions and
+// key bytes, the files as made and grown, byte for byte, trees of any shape
+// walked whole, and damaged files refused.
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cstring>
+#include <random>
+#include <string>
+#include <vector>
+
+#include "connector/todbase_harness.h"
+#include "host/endian.h"
+#include "host/platform.h"
+#include "index/mdx.h"
+
+namespace {
+
+using tests::Bytes;
+using tests::ReadFile;
+using tests::ScratchPath;
+
+#if defined(__SANITIZE_ADDRESS__)
+constexpr bool kSanitized = true;
+#elif defined(__has_feature)
+#if __has_feature(address_sanitizer)
+constexpr bool kSanitized = true;
+#else
+constexpr bool kSanitized = false;
+#endif
+#else
+constexpr bool kSanitized = false;
+#endif
+
+// A spoke whose layout 0 has NAME C(10), CITY C(4), AMOUNT N(10,2), BORN D.
+struct Fields {
+  tests::Target t{2};
+  Fields() {
+    t.Add('C', "NAME", 10);
+    t.Add('C', "CITY", 4);
+    t.Add('N', "AMOUNT", 10, 2);
+    t.Add('D', "BORN");
+  }
+  ZQSpoke* spoke() { return t.operator->(); }
+};
+
+// A record of one text field of `width` bytes, and a definition over it.
+// Its keys are given by the test, not built.
+struct OneField {
+  ZQRecord record;
+  ZQIndexDef def;
+  ZQDType text;
+  explicit OneField(int width, bool dups = true) {
+    text.Define("Text;usage=0x43");
+    text.Length(width);
+    def.AddSeg(0, int16_t(width), &text, record.NewField(text, "NAME"));
+    def.Name("NAME");
+    def.Dups(dups);
+  }
+};
+
+std::string Base(const std::string& name) {
+  std::string base = ScratchPath(name);
+  _unlink((base + ".mdx").c_str());
+  return base;
+}
+
+uint32_t Le32At(const Bytes& b, size_t at) { return GetLe32(&b[at]); }
+uint16_t Le16At(const Bytes& b, size_t at) { return GetLe16(&b[at]); }
+
+std::string Key(int v, int width) {
+  char buf[256];
+  snprintf(buf, sizeof buf, "%0*d", width, v);
+  return std::string(buf, size_t(width));
+}
+
+bool Add(ZQDBIndexBase& ix, const std::string& key, int32_t record) {
+  ZQString k(key.data(), int32_t(key.size()));
+  return ix.AddKey(k, record);
+}
+
+// ---------------------------------------------------------------------------
+// Expressions and keys
+
+TEST(IndexExpression, CompilesTheGrammarAndRefusesTheRest) {
+  Fields f;
+  struct Case {
+    const char* text;
+    int segs;              // -1: refused
+    int offset0, length0;  // of the first segment
+    bool binary0;          // the first segment makes an 8-byte double
+  } cases[] = {
+      {"", 0, 0, 0, false},
+      {"NAME+CITY", 2, 0, 10, false},
+      {"NAME + CITY", 2, 0, 10, false},
+      {"NAME CITY", 2, 0, 10, false},
+      {"name", 1, 0, 10, false},
+      {"substr(NAME,1,3)", 1, 1, 3, false},
+      {"SUBSTR(NAME,2)", 1, 2, 8, false},
+      {"SUBSTR(NAME , 2 , 3)", 1, 2, 3, false},
+      {"STR(AMOUNT,10,2)", 1, 0, 10, false},
+      {"STR(AMOUNT)", 1, 0, 0, false},
+      {"DTOS(BORN)+NAME", 2, 0, 8, false},
+      {"BORN", 1, 0, 8, true},
+      {"AMOUNT+CITY", 2, 0, 8, true},
+      {"UPPER(NAME)", -1, 0, 0, false},
+      {"(NAME)", -1, 0, 0, false},
+      {"NOSUCH", -1, 0, 0, false},
+      // A byte that starts no term ends the parse instead of stopping it for ever.
+      {"NAME-CITY", -1, 0, 0, false},
+      {"'X'", -1, 0, 0, false},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.text);
+    ZQIndexDef def;
+    ZQString text(c.text);
+    bool ok = ZQDBIndexBase::ParseExpr(text, &def, f.spoke());
+    ASSERT_EQ(ok, c.segs >= 0);
+    if (!ok) continue;
+    ASSERT_EQ(def.SegCount(), c.segs);
+    if (c.segs == 0) continue;
+    EXPECT_EQ(def[0].Offset(), c.offset0);
+    EXPECT_EQ(def[0].Length(), c.length0);
+    EXPECT_EQ(def[0].Type()->Kind() != DT_TEXT, c.binary0);
+  }
+}
+
+TEST(IndexExpression, BuildsKeysOfTextPaddedAndNumbersAsDoubles) {
+  Fields f;
+  f.t.Set(0, "AB");
+  f.t.Set(1, "ROME");
+  f.t.Set(2, "12.5");
+  ZQIndexDef def;
+  ZQString text("AMOUNT+CITY+NAME");
+  ASSERT_TRUE(ZQDBIndexBase::ParseExpr(text, &def, f.spoke()));
+  ZQString key;
+  ZQDBMdx index("/nonexistent/x", "T");  // BuildKey needs no file
+  index.BuildKey(key, &def);
+  const uint8_t twelve_and_a_half[8] = {0, 0, 0, 0, 0, 0, 0x29, 0x40};
+  ASSERT_EQ(key.length(), 8 + 4 + 10);
+  EXPECT_EQ(memcmp(key.c_str(), twelve_and_a_half, 8), 0);
+  EXPECT_EQ(std::string(key.c_str() + 8, 14), "ROMEAB        ");
+  EXPECT_EQ(ZQDBIndexBase::KeyFormLength(&def), 22);
+  ZQString printed;
+  ZQDBIndexBase::PrintExpr(printed, &def);
+  EXPECT_STREQ(printed.c_str(), "AMOUNT+CITY+NAME");
+}
+
+// ---------------------------------------------------------------------------
+// NDX
+
+TEST(NdxFile, IsMadeGrownAndClosedAsLaidOut) {
+  OneField f(10);
+  std::string path = ScratchPath("figures.ndx");
+  {
+    ZQDBMdx ix("unused", path.c_str(), f.record, &f.def);
+    ASSERT_TRUE(ix.OK());
+  }
+  Bytes fresh = ReadFile(path);
+  ASSERT_EQ(fresh.size(), 1024u);
+  // root 1, blocks 2, key length 10, 25 keys of 20 bytes, expression NAME
+  const uint8_t head[] = {1, 0, 0, 0, 2, 0, 0, 0, 0, 0, 0, 0, 10, 0, 25, 0, 0, 0, 20, 0, 0, 0, 0, 0, 'N', 'A', 'M', 'E', 0};
+  EXPECT_EQ(memcmp(fresh.data(), head, sizeof head), 0);
+  EXPECT_TRUE(std::all_of(fresh.begin() + 512, fresh.end(), [](uint8_t b) { return b == 0; }));
+  {
+    ZQDBMdx ix("unused", path.c_str());
+    ASSERT_TRUE(ix.OK());
+    for (int i = 0; i < 26; ++i) ASSERT_TRUE(Add(ix, Key(i, 10), i));
+  }
+  Bytes b = ReadFile(path);
+  EXPECT_EQ(Le32At(b, 0), 2u);  // the root moved to block 2
+  EXPECT_EQ(Le32At(b, 4), 4u);  // header, old root (now the right part), new root, left part
+  ASSERT_EQ(b.size(), 4u * 512);
+  // The root: one key, the left part (block 3) in its entry, the right part
+  // (block 1) in the last child's slot.
+  EXPECT_EQ(Le32At(b, 1024), 1u);
+  EXPECT_EQ(Le32At(b, 1024 + 4), 3u);
+  EXPECT_EQ(Le32At(b, 1024 + 4 + 20), 1u);
+  // Left 13 keys, right 13: the middle key of 25 went left with its run.
+  EXPECT_EQ(Le32At(b, 1536) + Le32At(b, 512), 26u);
+  EXPECT_EQ(Le32At(b, 1536), 13u);
+}
+
+TEST(NdxFile, UniqueIsMarkedInTheHeader) {
+  OneField f(10, false);
+  std::string path = ScratchPath("unique.ndx");
+  { ZQDBMdx ix("unused", path.c_str(), f.record, &f.def); }
+  EXPECT_EQ(ReadFile(path)[23], 1);
+}
+
+// ---------------------------------------------------------------------------
+// MDX
+
+TEST(MdxFile, OneTagIsLaidOutAsOtherProgramsReadIt) {
+  OneField f(30, false);
+  std::string base = Base("figures");
+  { ZQDBMdx ix(base.c_str(), "NAME", f.record, &f.def); ASSERT_TRUE(ix.OK()); }
+  Bytes b = ReadFile(base + ".mdx");
+  ASSERT_EQ(b.size(), 4096u);
+  EXPECT_EQ(b[0], 2);
+  EXPECT_EQ(std::string(reinterpret_cast<const char*>(&b[4])), "figures");
+  EXPECT_EQ(Le16At(b, 20), 2);
+  EXPECT_EQ(Le16At(b, 22), 1024);
+  EXPECT_EQ(b[25], 48);
+  EXPECT_EQ(b[28], 1);            // tags in use
+  EXPECT_EQ(Le32At(b, 32), 8u);   // next free block
+  EXPECT_EQ(b[512 + 17], 1);      // the head names the first tag
+  EXPECT_EQ(Le32At(b, 544), 4u);  // the tag's header block
+  EXPECT_EQ(std::string(reinterpret_cast<const char*>(&b[548])), "NAME");
+  EXPECT_EQ(b[544 + 15], 0x10);   // over one field
+  EXPECT_EQ(b[544 + 19], 2);
+  EXPECT_EQ(b[544 + 20], 'C');
+  const size_t tag = 4 * 512;
+  EXPECT_EQ(Le32At(b, tag), 6u);  // root
+  EXPECT_EQ(Le32At(b, tag + 4), 2u);
+  EXPECT_EQ(b[tag + 8], 0x40);
+  EXPECT_EQ(b[tag + 9], 'C');
+  EXPECT_EQ(Le16At(b, tag + 12), 30);
+  EXPECT_EQ(Le16At(b, tag + 14), 28);
+  EXPECT_EQ(Le16At(b, tag + 18), 36);
+  EXPECT_EQ(b[tag + 23], 0x40);
+  EXPECT_EQ(std::string(reinterpret_cast<const char*>(&b[tag + 24])), "NAME");
+}
+
+TEST(MdxFile, TheRootMovesAndTheHeadersFollowAtClose) {
+  OneField f(10);
+  std::string base = Base("rootmove");
+  {
+    ZQDBMdx ix(base.c_str(), "NAME", f.record, &f.def);
+    ASSERT_TRUE(ix.OK());
+    for (int i = 0; i < 64; ++i) ASSERT_TRUE(Add(ix, Key(i, 10), i));
+  }
+  Bytes b = ReadFile(base + ".mdx");
+  const size_t tag = 4 * 512;
+  EXPECT_EQ(Le16At(b, tag + 14), 63);
+  EXPECT_EQ(Le32At(b, tag), 8u);       // the 64th key moved the root to block 8
+  EXPECT_EQ(Le32At(b, tag + 4), 6u);   // three nodes of two units
+  EXPECT_EQ(Le32At(b, 32), 12u);       // next free: the file's end
+  ASSERT_EQ(b.size(), 12u * 512);
+  // The root: one entry for the left part (block 10); the right part (block
+  // 6) is its last child, in the link and again behind the last entry.
+  const size_t root = 8 * 512;
+  EXPECT_EQ(Le32At(b, root), 1u);
+  EXPECT_EQ(Le32At(b, root + 4), 6u);
+  EXPECT_EQ(Le32At(b, root + 8), 10u);
+  EXPECT_EQ(Le32At(b, root + 8 + 16), 6u);
+  // Leaves: the right part (block 6) links to the left part, which links to none.
+  EXPECT_EQ(Le32At(b, 6 * 512 + 4), 10u);
+  EXPECT_EQ(Le32At(b, 10 * 512 + 4), 0u);
+  EXPECT_EQ(Le32At(b, 10 * 512) + Le32At(b, 6 * 512), 64u);
+}
+
+TEST(MdxFile, TagsAreLinkedIntoANameTree) {
+  std::string base = Base("tree");
+  for (const char* name : {"M", "C", "T"}) {
+    OneField f(10);
+    f.def.Name(name);
+    ZQDBMdx ix(base.c_str(), name, f.record, &f.def);
+    ASSERT_TRUE(ix.OK());
+  }
+  Bytes b = ReadFile(base + ".mdx");
+  auto links = [&](int entry) {
+    size_t at = 512 + 32 * size_t(entry);
+    return std::vector<int>{b[at + 16], b[at + 17], b[at + 18]};
+  };
+  EXPECT_EQ(links(1), (std::vector<int>{2, 3, 0}));
+  EXPECT_EQ(links(2), (std::vector<int>{0, 0, 1}));
+  EXPECT_EQ(links(3), (std::vector<int>{0, 0, 1}));
+  EXPECT_EQ(Le32At(b, 544 + 64), 12u);  // the third tag's header block
+}
+
+TEST(MdxFile, RefusesWhatWouldShiftItsFields) {
+  std::string base = Base("limits");
+  OneField f(10);
+  EXPECT_FALSE(ZQDBMdx(base.c_str(), "ELEVENCHARS", f.record, &f.def).OK());
+  ZQRecord empty;
+  EXPECT_FALSE(ZQDBMdx(base.c_str(), "NOFIELDS", empty, &f.def).OK());
+  for (int i = 0; i < 47; ++i) {
+    std::string name = "T" + std::to_string(i);
+    ASSERT_TRUE(ZQDBMdx(base.c_str(), name.c_str(), f.record, &f.def).OK()) << i;
+  }
+  EXPECT_FALSE(ZQDBMdx(base.c_str(), "T47", f.record, &f.def).OK());
+  // The 47 tags are all still there.
+  EXPECT_TRUE(ZQDBMdx(base.c_str(), "T46").OK());
+}
+
+// The split point: equal keys stay on one side where a run ends near the
+// middle, and a run over the whole middle is split there.
+TEST(MdxFile, SplitsBesideRunsOfEqualKeysOrInsideThem) {
+  struct Case {
+    const char* keys;  // one letter per key, in record order
+    uint32_t left;     // keys in the left part once the ninth is in
+  } cases[] = {{"AABBBBCDE", 6}, {"ABCCCCCCD", 5}, {"CCCCCCCCC", 6}};
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.keys);
+    OneField f(117);  // entries of 124 bytes: 8 keys in a node
+    std::string base = Base("split");
+    {
+      ZQDBMdx ix(base.c_str(), "NAME", f.record, &f.def);
+      for (int i = 0; c.keys[i] != '\0'; ++i) ASSERT_TRUE(Add(ix, std::string(117, c.keys[i]), i));
+    }
+    Bytes b = ReadFile(base + ".mdx");
+    uint32_t root = Le32At(b, 4 * 512);
+    uint32_t left = Le32At(b, root * 512 + 8);
+    EXPECT_EQ(Le32At(b, left * 512), c.left);
+  }
+}
+
+// ---------------------------------------------------------------------------
+// Trees of every shape: every record once, in key order, after reopening.
+
+void CheckWalk(ZQDBMdx& ix, int n, int dups, int width, bool backwards) {
+  std::vector<char> seen(static_cast<size_t>(n), 0);
+  ZQString key, prev;
+  int count = 0;
+  for (int32_t r = ix.FirstKey(key); r != -1; r = ix.NextKey(key), ++count) {
+    ASSERT_TRUE(r >= 0 && r < n && !seen[size_t(r)]) << r;
+    seen[size_t(r)] = 1;
+    ASSERT_EQ(std::string(key.c_str(), size_t(key.length())), Key(dups ? r % dups : r, width));
+    ASSERT_FALSE(count > 0 && prev > key);
+    prev = key;
+  }
+  ASSERT_EQ(count, n);
+  if (!backwards) return;
+  count = 0;
+  for (int32_t r = ix.LastKey(key); r != -1; r = ix.PrevKey(key), ++count) {
+    ASSERT_FALSE(count > 0 && key > prev);
+    prev = key;
+  }
+  ASSERT_EQ(count, n);
+  // An exact search finds every key, the highest key of a node included.
+  for (int v = 0; v < (dups ? dups : n); v += 1 + n / 997) {
+    ZQString q(Key(v, width).c_str(), width);
+    ASSERT_NE(ix.FindKey(q, true), -1) << v;
+  }
+}
+
+TEST(DbaseTrees, HoldEveryKeyInAnyOrderOfArrival) {
+  std::vector<int> sizes = {100000};
+  if (!kSanitized) sizes.push_back(1000000);
+  for (int n : sizes)
+    for (const char* name : {"NAME", "TREE.NDX"})
+      for (int order = 0; order < 3; ++order) {
+        int dups = order == 2 ? 0 : 7;  // rising and falling with runs of equal keys
+        int width = n > 100000 ? 30 : 10;
+        SCOPED_TRACE(std::to_string(n) + " " + name + " order " + std::to_string(order));
+        std::vector<int> records(static_cast<size_t>(n));
+        for (int i = 0; i < n; ++i) records[size_t(i)] = i;
+        if (order == 1) std::reverse(records.begin(), records.end());
+        if (order == 2) std::shuffle(records.begin(), records.end(), std::mt19937(7));
+        OneField f(width);
+        std::string base = Base("tree");
+        std::string tag = std::string(name) == "NAME" ? name : ScratchPath(name);
+        {
+          ZQDBMdx ix(base.c_str(), tag.c_str(), f.record, &f.def);
+          ASSERT_TRUE(ix.OK());
+          for (int r : records) ASSERT_TRUE(Add(ix, Key(dups ? r % dups : r, width), r));
+        }
+        ZQDBMdx ix(base.c_str(), tag.c_str());
+        ASSERT_TRUE(ix.OK());
+        CheckWalk(ix, n, dups, width, !ix.IsMdx());
+      }
+}
+
+// ---------------------------------------------------------------------------
+// Damage
+
+TEST(DbaseDamage, IsRefusedOrEndsTheWalkNeverAHang) {
+  OneField f(10);
+  std::string path = ScratchPath("damage.ndx");
+  {
+    ZQDBMdx ix("unused", path.c_str(), f.record, &f.def);
+    for (int i = 0; i < 2000; ++i) ASSERT_TRUE(Add(ix, Key(i * 7919 % 2000, 10), i));
+  }
+  Bytes good = ReadFile(path);
+  uint32_t root = Le32At(good, 0);
+  struct Case {
+    const char* what;
+    size_t at;
+    uint32_t value;
+    int width;  // 2 or 4 bytes
+  } cases[] = {
+      {"root past the end", 0, 99999, 4},
+      {"root in the header", 0, 0, 4},
+      {"key length 0", 12, 0, 2},
+      {"key length beyond a block", 12, 600, 2},
+      {"entry size below the key", 18, 8, 2},
+      {"key count beyond a block", root * 512, 5000, 4},
+      {"a child that is its parent", root * 512 + 4, root, 4},
+      {"a child past the end", root * 512 + 4, 0x7FFFFFF, 4},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.what);
+    Bytes bad = good;
+    if (c.width == 4) PutLe32(&bad[c.at], c.value);
+    else PutLe16(&bad[c.at], uint16_t(c.value));
+    std::string damaged = tests::WriteScratch("damaged.ndx", bad);
+    ZQDBMdx ix("unused", damaged.c_str());
+    if (!ix.OK()) continue;
+    ZQString key;
+    int steps = 0;
+    for (int32_t r = ix.FirstKey(key); r != -1 && steps < 100000; r = ix.NextKey(key)) ++steps;
+    EXPECT_LT(steps, 100000);
+    ZQString q(Key(5, 10).c_str(), 10);
+    ix.FindKey(q, true);
+  }
+}
+
+TEST(DbaseDamage, AMissingFileOrTagIsNotOk) {
+  OneField f(10);
+  std::string base = Base("missing");
+  EXPECT_FALSE(ZQDBMdx(base.c_str(), "NAME").OK());
+  { ZQDBMdx ix(base.c_str(), "NAME", f.record, &f.def); }
+  EXPECT_FALSE(ZQDBMdx(base.c_str(), "OTHER").OK());
+  EXPECT_TRUE(ZQDBMdx(base.c_str(), "name").OK());  // names are found in any case
+  EXPECT_FALSE(ZQDBMdx("unused", ScratchPath("none.ndx").c_str()).OK());
+}
+
+}  // namespace

@@ -532,25 +532,36 @@ void ZQDBFoxNode::Invalidate() {
 }
 
 int32_t ZQDBFoxNode::DecodeCompactKey(ZQString& key, int index) {
+  uint8_t* base = KeySlot(0);
+  memset(base, ' ', size_t(index + 1) * size_t(keyLength));
   int keyPos = kLeafArea;
   int32_t record = -1;
   for (int i = 0; i <= index; ++i) {
-    record = DecodeCompactKey(key, i, keyPos);
+    record = DecodeStep(base, i, keyPos);
     if (record < 0) return -1;
   }
+  key.CopyN(reinterpret_cast<const char*>(base) + index * keyLength, keyLength, 0);
   return record;
 }
 
-// One step of rebuilding a compact leaf: key `index` from key `index` - 1
-// (already in its slot) and the stored bytes that end at `keyPos`. The
-// duplicate count takes the start of the previous key, the trailing count
-// stands for blanks. -1 for an entry that the block can't hold.
 int32_t ZQDBFoxNode::DecodeCompactKey(ZQString& key, int index, int& keyPos) {
+  uint8_t* base = KeySlot(0);
+  memset(base + index * keyLength, ' ', size_t(keyLength));
+  int32_t record = DecodeStep(base, index, keyPos);
+  if (record >= 0) key.CopyN(reinterpret_cast<const char*>(base) + index * keyLength, keyLength, 0);
+  return record;
+}
+
+// One step of rebuilding a compact leaf into the key slots at `base`: key
+// `index` from key `index` - 1 and the stored bytes that end at `keyPos`.
+// The duplicate count takes the start of the previous key, the trailing
+// count stands for blanks, which the slot holds already. -1 for an entry
+// that the block can't hold.
+inline int32_t ZQDBFoxNode::DecodeStep(uint8_t* base, int index, int& keyPos) {
   const Widths& w = widths;
   const uint8_t* area = raw + kLeafData;
-  const uint8_t* e = area + index * w.entryBytes;
-  uint64_t v = 0;
-  for (int j = 0; j < w.entryBytes; ++j) v |= uint64_t(e[j]) << (8 * j);
+  uint64_t v = GetLe64(area + index * w.entryBytes);  // the block has room behind its last byte
+  if (w.entryBytes < 8) v &= (uint64_t{1} << (8 * w.entryBytes)) - 1;
   uint32_t record = uint32_t(v & w.recordMask());
   int dup = int(ShiftRight(v, w.recordBits) & uint64_t(w.dupMask()));
   int trail = int(ShiftRight(v, w.recordBits + w.dupBits) & uint64_t(w.trailMask()));
@@ -559,12 +570,10 @@ int32_t ZQDBFoxNode::DecodeCompactKey(ZQString& key, int index, int& keyPos) {
       keyPos - stored < keyCount * w.entryBytes)
     return -1;
   keyPos -= stored;
-  uint8_t* slot = KeySlot(index);
+  uint8_t* slot = base + index * keyLength;
   if (dup > 0) memcpy(slot, slot - keyLength, size_t(dup));
   memcpy(slot + dup, area + keyPos, size_t(stored));
-  memset(slot + dup + stored, ' ', size_t(trail));
   entries[index] = Entry{record, uint8_t(dup), uint8_t(trail)};
-  key.CopyN(reinterpret_cast<const char*>(slot), keyLength, 0);
   return int32_t(record);
 }
 
@@ -942,15 +951,16 @@ void ZQDBFoxNode::EncodeBlock(uint8_t* out, int first, int count, int32_t left, 
     return;
   }
   const Widths& w = widths;
-  PutLeafHeader(out, w, kLeafArea - RangeBytes(first, count));
+  PutLeafHeader(out, w, first == 0 && count == keyCount ? freeBytes : kLeafArea - RangeBytes(first, count));
   uint8_t* area = out + kLeafData;
+  const uint8_t* key = KeyBytes(first);
   int keyPos = kLeafArea;
-  for (int j = 0; j < count; ++j) {
+  for (int j = 0; j < count; ++j, key += keyLength) {
     const Entry& e = entries[first + j];
     int dup = j == 0 ? 0 : e.dup;
     int stored = keyLength - dup - e.trail;
     keyPos -= stored;
-    memcpy(area + keyPos, KeyBytes(first + j) + dup, size_t(stored));
+    memcpy(area + keyPos, key + dup, size_t(stored));
     uint64_t v = uint64_t(e.record & w.recordMask()) | uint64_t(dup) << w.recordBits |
                  uint64_t(e.trail) << (w.recordBits + w.dupBits);
     for (int b = 0; b < w.entryBytes; ++b) area[j * w.entryBytes + b] = uint8_t(v >> (8 * b));

@@ -175,6 +175,7 @@ class ZQ_EXPORT ZQDBFoxNode : public ZQDBNodeBase {
   int32_t ReadNode(int32_t where);
   int32_t DecodeCompactKey(ZQString& key, int index);
   int32_t DecodeCompactKey(ZQString& key, int index, int& keyPos);
+  int32_t DecodeStep(uint8_t* base, int index, int& keyPos);
   bool RootSplit();
   bool ChildSplit(const uint8_t* key, uint32_t record);
 
@@ -222,8 +223,9 @@ class ZQ_EXPORT ZQDBFoxNode : public ZQDBNodeBase {
   int freeBytes = 0;
   Widths widths;
   Plan plan;
-  // The block as read (interior nodes and non-compact leaves work on it).
-  uint8_t raw[kBlock] = {};
+  // The block as read (interior nodes and non-compact leaves work on it),
+  // and 8 bytes of room behind it for whole-word reads of entries.
+  uint8_t raw[kBlock + 8] = {};
   // A compact leaf, decoded: keyCount keys of keyLength bytes each.
   ZQString keys;
   Entry entries[kMaxLeafKeys + 1] = {};

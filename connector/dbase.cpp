@@ -80,7 +80,7 @@ BATCHERR ZQDbase::MakeFields(ZQRecord& layout, const ZQConnTarget& target) {
     if (field == nullptr) return ZQ_NO_MEMORY;
     field->Name(fd->name);
   }
-  if (opened[0] != '\0') DescribeIndices(opened);
+  if (opened[0] != '\0' && DescribeOnOpen) DescribeIndices(opened);
   RecordMap.Reset();
   // Nothing read yet: a first request for record 1 must not take physical
   // record 0 for logical record 0 unread (it may be deleted).

@@ -120,6 +120,10 @@ class ZQ_EXPORT ZQDbase : public ZQDbaseOptions {
   ZQString MemoText;
   ZQHashTable RecordMap{512};
   ZQDBFIELD* FieldList[kMaxFields] = {};
+  // MakeFields lists the table's indexes to the host; not so when the
+  // target reads a table's layout into a record of the host's, since the
+  // index definitions would then name fields the records never reach.
+  bool DescribeOnOpen = true;
   ZQDBIndexBase* OrderIndex = nullptr;
   ZQDBFoxIndex* FoxIndexList = nullptr;
   // Directory and base name of the table, without extension. Sized for the

@@ -131,7 +131,9 @@ BATCHERR ZQToDbase::ValidateLocalRecord(const ZQRecord& record, int& field) {
 }
 
 BATCHERR ZQToDbase::MakeFields(ZQRecord& record, const ZQConnTarget& target) {
+  dbase.DescribeOnOpen = false;
   BATCHERR rc = dbase.MakeFields(record, target);
+  dbase.DescribeOnOpen = true;
   dbase.CloseFile(nullptr);
   return rc;
 }

@@ -319,6 +319,7 @@ int CmdCat(const Args& args) {
 int CmdKeys(const Args& args) {
   if (args.files.size() != 1) return Usage("keys takes one table");
   if (args.keys.index.empty()) return Usage("keys needs --index NAME");
+  if (!args.convert.write.table.indexes.empty()) return Usage("keys takes --index NAME, without =EXPR");
   if (args.format == OutputFormat::kTable) return Usage("keys writes csv or jsonl");
   SourcePtr spoke;
   if (int rc = OpenOrFail(args, &spoke)) return rc;
@@ -331,6 +332,8 @@ int CmdKeys(const Args& args) {
 
 int CmdConvert(const Args& args) {
   if (args.files.size() != 2) return Usage("convert takes a source and a target");
+  if (!args.keys.index.empty()) return Usage("--index takes NAME=EXPR, not " + args.keys.index);
+  if (args.keys.has_seek || args.keys.reverse) return Usage("--seek and --reverse go with keys");
   if (args.convert.write.mode != 2 && !args.convert.key.empty()) return Usage("--key goes with --mode update");
   ConvertOptions opts = args.convert;
   opts.read.table = args.source;

@@ -1,0 +1,80 @@
+# Indexes through zqdb: convert --index makes them, keys walks them, info
+# lists them, appends keep them current; wrong definitions are usage errors
+# or clear refusals, and a dialect without index files says so.
+source "$(dirname "$0")/lib.bash" "$1"
+
+err_has() {
+  if grep -qF -- "$1" "$ERR"; then PASSED=$((PASSED + 1)); else fail "stderr lacks '$1': $(head -c 400 "$ERR")"; fi
+}
+# out_is < EXPECTED: the last run's stdout is EXPECTED exactly.
+out_is() {
+  if cmp -s - "$OUT"; then PASSED=$((PASSED + 1)); else fail "stdout: $(head -c 300 "$OUT")"; fi
+}
+
+case $ZQDB in /*) ;; *) ZQDB=$PWD/$ZQDB ;; esac
+cd "$WORK" || exit 1
+
+printf 'NAME,CITY,QTY\nbob,ROME,3\nann,PARIS,1\ncid,ROME,2\nann,OSLO,5\n' >people.csv
+printf 'NAME,CITY,QTY\nabe,LIMA,4\n' >more.csv
+
+# --- Made, listed and walked --------------------------------------------------
+expect_run 0 convert people.csv p.dbf --index name=NAME --unique-index byc=CITY+NAME --index "$WORK/q.ndx=QTY" --no-progress
+err_has "index $WORK/q.ndx: its numeric or date keys are 8-byte doubles"
+expect_run 0 info p.dbf && expect_out "NAME        C    yes        NAME" && expect_out "BYC         C    no         CITY+NAME"
+expect_run 0 keys p.dbf --index NAME
+out_is <<'OUT'
+key,recno
+ann,2
+ann,4
+bob,1
+cid,3
+OUT
+expect_run 0 keys p.dbf --index byc --format jsonl --seek P
+out_is <<'OUT'
+{"key": "PARISann", "recno": 2}
+{"key": "ROME bob", "recno": 1}
+{"key": "ROME cid", "recno": 3}
+OUT
+# Numeric keys are doubles in their stored byte order, least significant
+# byte first: 2.0 stores 00 .. 00 40, 1.0 00 .. F0 3F, so 2 comes first.
+expect_run 0 keys p.dbf --index "$WORK/q.ndx"
+out_is <<'OUT'
+key,recno
+2,3
+3,1
+5,4
+1,2
+OUT
+expect_run 0 keys p.dbf --index "$WORK/q.ndx" --reverse --seek 5
+out_is <<'OUT'
+key,recno
+5,4
+3,1
+2,3
+OUT
+expect_run 2 keys p.dbf --index NAME --reverse && expect_err "zqdb: an MDX tag is walked forwards only"
+expect_run 1 keys p.dbf --index NOPE && expect_err "zqdb: no index NOPE could be opened (the table's indexes: NAME, BYC)"
+expect_run 2 keys p.dbf && expect_err "zqdb: keys needs --index NAME"
+
+# --- Appends reach every tag --------------------------------------------------
+expect_run 0 convert more.csv p.dbf --mode append --no-progress
+expect_run 0 keys p.dbf --index NAME && expect_out "abe,5"
+expect_run 0 keys p.dbf --index BYC && expect_out "LIMA abe,5"
+
+# --- Refused definitions ------------------------------------------------------
+expect_run 2 convert people.csv x.dbf --index NAME --no-progress && expect_err "zqdb: --index takes NAME=EXPR"
+expect_run 1 convert people.csv x.dbf --index "A=UPPER(NAME)" --no-progress && expect_err 'zqdb: index A: cannot index on "UPPER(NAME)"'
+expect_run 1 convert people.csv x.dbf --index "A=NOPE" --no-progress && expect_err 'zqdb: index A: cannot index on "NOPE"'
+expect_run 1 convert people.csv x.dbf --index "TOOLONGNAME1=NAME" --no-progress && expect_err "a tag name is 1 to 10 letters"
+expect_run 1 convert people.csv x.dbf --index "A=STR(QTY,5)" --no-progress && expect_err '"STR(QTY,5)" would be stored as "QTY"'
+expect_run 1 convert people.csv x.dbf --index "a.idx=NAME" --no-progress && expect_err "an index file of this dialect ends in .ndx"
+expect_run 1 convert people.csv x.dbf --index A=NAME --index a=CITY --no-progress && expect_err "index A is given twice"
+expect_run 1 convert more.csv p.dbf --mode append --index A=NAME --no-progress && expect_err "zqdb: --index makes the indexes of a new table"
+if [ -e x.dbf ]; then fail "a refused table was left behind"; else PASSED=$((PASSED + 1)); fi
+
+# --- A dialect without index files -------------------------------------------
+expect_run 0 convert people.csv c.dbf --to clipper --index A=NAME --no-progress
+err_has "this dialect has no index files: 1 index definition(s) ignored"
+if [ -e c.mdx ]; then fail "an MDX was made for a Clipper table"; else PASSED=$((PASSED + 1)); fi
+
+finish

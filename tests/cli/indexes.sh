@@ -61,6 +61,11 @@ expect_run 0 convert more.csv p.dbf --mode append --no-progress
 expect_run 0 keys p.dbf --index NAME && expect_out "abe,5"
 expect_run 0 keys p.dbf --index BYC && expect_out "LIMA abe,5"
 
+# --- Update: the new key goes in, the old one stays ----------------------------
+printf 'NAME,CITY,QTY\nzed,ROME,3\n' >upd.csv
+expect_run 0 convert upd.csv p.dbf --mode update --key QTY --no-progress
+expect_run 0 keys p.dbf --index NAME && expect_out "bob,1" && expect_out "zed,1"
+
 # --- Refused definitions ------------------------------------------------------
 expect_run 2 convert people.csv x.dbf --index NAME --no-progress && expect_err "zqdb: --index takes NAME=EXPR"
 expect_run 1 convert people.csv x.dbf --index "A=UPPER(NAME)" --no-progress && expect_err 'zqdb: index A: cannot index on "UPPER(NAME)"'

@@ -19,6 +19,10 @@ constexpr int32_t kEntryChild = 0, kMdxEntryKey = 4, kNdxEntryRecord = 4, kNdxEn
 
 constexpr int32_t kUnit = 512;
 
+// A record number of the file (from 1) as the key operations give it (from
+// 0); one that can't be a record's (0, or negative in a damaged file) is -1.
+int32_t FromFile(int32_t record) { return record > 0 ? record - 1 : -1; }
+
 // The end of the file rounded up to a whole unit: where a new block goes.
 int32_t NewBlockOffset(int fd) {
   int32_t end = _lseek(fd, 0, 2);
@@ -170,7 +174,7 @@ int32_t ZQDBMdxNode::Give(ZQString& key) {
     return -1;
   }
   key.CopyN(reinterpret_cast<const char*>(KeyAt(current)), keyLength, 0);
-  return RecordAt(current) - 1;
+  return FromFile(RecordAt(current));
 }
 
 int32_t ZQDBMdxNode::CurrentKey(ZQString& key) {
@@ -273,9 +277,9 @@ int32_t ZQDBMdxNode::FindKey(const ZQString& key, bool exact) {
     if (!Child()->Move(ChildAt(i))) return -1;
     return child->FindKey(key, exact);
   }
-  if (i == keyCount) return exact || keyCount == 0 ? -1 : RecordAt(keyCount - 1) - 1;
+  if (i == keyCount) return exact || keyCount == 0 ? -1 : FromFile(RecordAt(keyCount - 1));
   if (exact && CompareKey(i, key) != 0) return -1;
-  return RecordAt(i) - 1;
+  return FromFile(RecordAt(i));
 }
 
 bool ZQDBMdxNode::AddKey(ZQString& key, int32_t record) {

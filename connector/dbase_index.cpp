@@ -3,6 +3,7 @@
 
 #include "connector/dbase.h"
 #include "index/dbindex.h"
+#include "index/foxidx.h"
 #include "index/mdx.h"
 
 IndexFamily IndexFamilyOf(int dialect) {
@@ -10,6 +11,10 @@ IndexFamily IndexFamilyOf(int dialect) {
     case DIALECT_DBASE4:
     case DIALECT_UNNAMED:
     case DIALECT_VDBASE: return IndexFamily::kDbase;
+    // Visual FoxPro tables keep their CDX as FoxPro tables do, so that the
+    // applications that own them see the records written here.
+    case DIALECT_FOXPRO:
+    case DIALECT_VFOXPRO: return IndexFamily::kFox;
     default: return IndexFamily::kNone;
   }
 }
@@ -17,6 +22,7 @@ IndexFamily IndexFamilyOf(int dialect) {
 void ZQDbase::DescribeIndices(const char* name) {
   switch (IndexFamilyOf(VersionNumber)) {
     case IndexFamily::kDbase: ZQDBMdx::BuildIndexList(name, OwnerSpoke()); break;
+    case IndexFamily::kFox: ZQDBFoxIndex::BuildIndexList(name, OwnerSpoke(), FoxIndexList); break;
     default: break;  // the host's list stays as it was
   }
 }
@@ -24,6 +30,7 @@ void ZQDbase::DescribeIndices(const char* name) {
 ZQDBIndexBase* ZQDbase::OpenIndex(const char* base, const char* name) {
   switch (IndexFamilyOf(VersionNumber)) {
     case IndexFamily::kDbase: return new (std::nothrow) ZQDBMdx(base, name);
+    case IndexFamily::kFox: return new (std::nothrow) ZQDBFoxIndex(base, name, FoxIndexList);
     default: return nullptr;
   }
 }
@@ -31,6 +38,7 @@ ZQDBIndexBase* ZQDbase::OpenIndex(const char* base, const char* name) {
 ZQDBIndexBase* ZQDbase::CreateIndex(const char* base, const ZQRecord& fields, ZQIndexDef* def) {
   switch (IndexFamilyOf(VersionNumber)) {
     case IndexFamily::kDbase: return new (std::nothrow) ZQDBMdx(base, def->Name(), fields, def);
+    case IndexFamily::kFox: return new (std::nothrow) ZQDBFoxIndex(base, def->Name(), fields, *def, FoxIndexList);
     default: return nullptr;
   }
 }
@@ -38,6 +46,8 @@ ZQDBIndexBase* ZQDbase::CreateIndex(const char* base, const ZQRecord& fields, ZQ
 void ZQDbase::DropIndexes() {
   delete OrderIndex;
   OrderIndex = nullptr;
+  delete FoxIndexList;
+  FoxIndexList = nullptr;
 }
 
 namespace {
@@ -87,6 +97,10 @@ ZQIndexWalk* ZQDbase::OpenIndexWalk(const char* name, ZQIndexDef* def) {
     expression = mdx->Expression();
     backwards = !mdx->IsMdx();  // MDX tags are walked forwards only
     unique = mdx->Unique();
+  } else {
+    auto* fox = static_cast<ZQDBFoxIndex*>(index);
+    fox->Expression(expression);
+    unique = fox->Unique();
   }
   def->Name(name);
   def->Dups(!unique);
@@ -114,6 +128,10 @@ void ZQDbase::ReportIndexes(ZQString& text) {
       file += ".mdx";
       ZQDBMdx tag(BasePath, def->Name());
       if (tag.OK()) expression = tag.Expression();
+    } else {
+      file += ".cdx";
+      ZQDBFoxIndex tag(BasePath, def->Name(), FoxIndexList);
+      if (tag.OK()) tag.Expression(expression);
     }
     if (expression.length() == 0) ZQDBIndexBase::PrintExpr(expression, const_cast<ZQIndexDef*>(def));
     // The key type follows from the segments: a single date or numeric

@@ -1,5 +1,7 @@
 #include "engine/dbf_source.h"
 
+#include <unistd.h>
+
 #include <cctype>
 #include <cstdio>
 #include <cstdlib>
@@ -56,6 +58,15 @@ bool ApplyDialect(ZQSpoke* spoke, const std::string& value) {
   return true;
 }
 
+bool HasSibling(const std::string& path, const std::string& ext) {
+  std::string base = path;
+  size_t dot = base.rfind('.');
+  if (dot != std::string::npos && base.find('/', dot) == std::string::npos) base.resize(dot);
+  std::string upper = ext;
+  for (char& c : upper) c = char(toupper(static_cast<unsigned char>(c)));
+  return access((base + "." + ext).c_str(), F_OK) == 0 || access((base + "." + upper).c_str(), F_OK) == 0;
+}
+
 int GuessDialect(const std::string& path) {
   FILE* f = fopen(path.c_str(), "rb");
   int v = f ? fgetc(f) : EOF;
@@ -78,6 +89,11 @@ int GuessDialect(const std::string& path) {
       fclose(m);
       return dbase4 ? 2 : 7;
     }
+  }
+  if (v == 0x03 && HasSibling(path, "cdx") && !HasSibling(path, "mdx")) {
+    // FoxPro writes 0x03 too when a table has no memo field; its CDX of the
+    // same name beside it tells it from a dBASE table.
+    return 6;
   }
   switch (v) {
     case 0x02: return 0;  // dBASE II (Enable's narrow tables read the same)

@@ -38,6 +38,9 @@ bool ApplyDialect(ZQSpoke* spoke, const std::string& value);
 // The dialect that a table's version byte points to, for tables opened
 // without --dialect.
 int GuessDialect(const std::string& path);
+// True when a file of the table's base name with the extension `ext` (in
+// lower or upper case) lies beside it.
+bool HasSibling(const std::string& path, const std::string& ext);
 
 // Opens `path`; on failure `error` holds the spoke's message and the result
 // is the spoke's code (non-zero).

@@ -4,10 +4,12 @@
 #include <unistd.h>
 
 #include <cstdio>
+#include <cstdlib>
 #include <string>
 
 #include "engine/endpoints.h"
 #include "engine/indexes.h"
+#include "engine/report.h"
 #include "engine/table_output.h"
 
 namespace {
@@ -26,6 +28,7 @@ class TableTarget : public Target {
   bool Open(std::string* error) override {
     if (existing_) before_ = CountRecords();
     if (!AddIndexDefinitions(spoke_.get(), opts_.table, existing_, error)) return false;
+    if (existing_) WarnStaleIndexes();
     if (opts_.mode == 0 && !staging_.Begin(path_, &work_, error)) return false;
     return Target::Open(error);
   }
@@ -53,6 +56,29 @@ class TableTarget : public Target {
       old->ConnectionClose();
     }
     return count;
+  }
+
+  // Appends keep the table's MDX tags (dBASE) or CDX tags (FoxPro) current;
+  // other index files of the table's name beside it, and any production
+  // index of a dialect without index files, stay as they were: one line
+  // says so before records are added.
+  void WarnStaleIndexes() {
+    ZQString v;
+    spoke_->GetOption("version", v);
+    IndexKind kind = IndexKindOf(atoi(v.c_str()));
+    std::string found;
+    for (const char* ext : {"mdx", "cdx", "ndx", "ntx", "idx"}) {
+      if ((kind == IndexKind::kDbase && ext[0] == 'm') || (kind == IndexKind::kFox && ext[0] == 'c')) continue;
+      if (HasSibling(path_, ext)) found += std::string(found.empty() ? "" : ", ") + "." + ext;
+    }
+    unsigned char header[32] = {};
+    FILE* f = fopen(path_.c_str(), "rb");
+    bool production = kind == IndexKind::kNone && f != nullptr && fread(header, 1, sizeof header, f) == sizeof header &&
+                      (header[28] & 1) != 0;
+    if (f != nullptr) fclose(f);
+    if (found.empty() && !production) return;
+    Warn(path_ + " has " + (found.empty() ? std::string("a production index") : "index files (" + found + ")") +
+         " that this dialect doesn't keep: they will be out of date");
   }
 
   TableConnector connector_;

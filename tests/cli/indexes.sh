@@ -82,4 +82,25 @@ expect_run 0 convert people.csv c.dbf --to clipper --index A=NAME --no-progress
 err_has "this dialect has no index files: 1 index definition(s) ignored"
 if [ -e c.mdx ]; then fail "an MDX was made for a Clipper table"; else PASSED=$((PASSED + 1)); fi
 
+# --- FoxPro: CDX tags and IDX files, found without --dialect ------------------
+expect_run 0 convert people.csv f.dbf --to foxpro --index name=NAME --index "$WORK/f.idx=CITY" --index-form plain --no-progress
+expect_run 0 info f.dbf && expect_out "dialect:     6 (FoxPro)" && expect_out "NAME        C    yes        name"
+expect_run 0 convert more.csv f.dbf --mode append --no-progress
+expect_run 0 keys f.dbf --index name --reverse
+out_is <<'OUT'
+key,recno
+cid,3
+bob,1
+ann,4
+ann,2
+abe,5
+OUT
+expect_run 0 keys f.dbf --index "$WORK/f.idx" && expect_out "ROME,3"
+
+# --- Appending where the dialect keeps no index ----------------------------
+expect_run 0 convert more.csv c.dbf --to clipper --no-progress
+: >c.ntx
+expect_run 0 convert more.csv c.dbf --mode append --no-progress
+err_has "c.dbf has index files (.ntx) that this dialect doesn't keep: they will be out of date"
+
 finish

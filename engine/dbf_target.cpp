@@ -3,6 +3,7 @@
 // a table, and read back once written.
 #include <unistd.h>
 
+#include <cctype>
 #include <cstdio>
 #include <cstdlib>
 #include <string>
@@ -37,7 +38,15 @@ class TableTarget : public Target {
     ZQString v;
     spoke_->GetOption("version", v);
     if (!VerifyTable(work_, connector_, v.c_str(), opts_.table, before_ + added, error)) return false;
-    return opts_.mode != 0 || staging_.Commit(error);
+    if (opts_.mode != 0) return true;
+    bool staged_mdx = HasSibling(work_, "mdx"), staged_cdx = HasSibling(work_, "cdx");
+    if (!staging_.Commit(error)) return false;
+    // An MDX or CDX file of the target's name that the new table didn't
+    // bring indexed the table just replaced: left there, it would be taken
+    // for this table's and get its keys added to the old ones.
+    if (!staged_mdx) RemoveOldIndex("mdx");
+    if (!staged_cdx) RemoveOldIndex("cdx");
+    return true;
   }
 
  private:
@@ -56,6 +65,17 @@ class TableTarget : public Target {
       old->ConnectionClose();
     }
     return count;
+  }
+
+  void RemoveOldIndex(const char* ext) {
+    std::string base = path_;
+    size_t dot = base.rfind('.');
+    if (dot != std::string::npos && base.find('/', dot) == std::string::npos) base.resize(dot);
+    std::string upper = ext;
+    for (char& c : upper) c = char(toupper(static_cast<unsigned char>(c)));
+    for (const std::string& old : {base + "." + ext, base + "." + upper})
+      if (access(old.c_str(), F_OK) == 0 && unlink(old.c_str()) == 0)
+        Warn("removed " + old + ", the index file of the table this one replaced");
   }
 
   // Appends keep the table's MDX tags (dBASE) or CDX tags (FoxPro) current;

@@ -77,6 +77,11 @@ expect_run 1 convert people.csv x.dbf --index A=NAME --index a=CITY --no-progres
 expect_run 1 convert more.csv p.dbf --mode append --index A=NAME --no-progress && expect_err "zqdb: --index makes the indexes of a new table"
 if [ -e x.dbf ]; then fail "a refused table was left behind"; else PASSED=$((PASSED + 1)); fi
 
+# --- A replaced table takes its old MDX file with it ---------------------------
+cp p.dbf r.dbf && cp p.mdx r.mdx
+expect_run 0 convert people.csv r.dbf --no-progress && err_has "removed r.mdx, the index file of the table this one replaced"
+if [ -e r.mdx ]; then fail "the old MDX stayed beside the new table"; else PASSED=$((PASSED + 1)); fi
+
 # --- A dialect without index files -------------------------------------------
 expect_run 0 convert people.csv c.dbf --to clipper --index A=NAME --no-progress
 err_has "this dialect has no index files: 1 index definition(s) ignored"

@@ -307,6 +307,31 @@ TEST(MdxFile, SplitsBesideRunsOfEqualKeysOrInsideThem) {
 }
 
 // ---------------------------------------------------------------------------
+// The cursor by ordinal
+
+TEST(IndexCursor, MovesOneKeyAtATimeBothWaysWhereTheKindCan) {
+  OneField f(10);
+  std::string ndx = ScratchPath("cursor.ndx"), base = Base("cursor");
+  for (const std::string& tag : {ndx, std::string("NAME")}) {
+    SCOPED_TRACE(tag);
+    {
+      ZQDBMdx ix(base.c_str(), tag.c_str(), f.record, &f.def);
+      for (int i = 0; i < 60; ++i) ASSERT_TRUE(Add(ix, Key(59 - i, 10), i));  // record 0 stored as 1
+    }
+    ZQDBMdx ix(base.c_str(), tag.c_str());
+    EXPECT_EQ(ix.GetFirst(), 59);
+    EXPECT_EQ(ix.GetRecord(30), 29);
+    EXPECT_EQ(ix.GetNext(), 28);
+    EXPECT_EQ(ix.GetRecord(59), 0);
+    EXPECT_EQ(ix.GetRecord(60), -1);  // past the last key
+    // Back to the first: NDX steps back; an MDX tag can't.
+    EXPECT_EQ(ix.GetFirst(), ix.IsMdx() ? -1 : 59);
+  }
+  ZQDBMdx none(base.c_str(), "NOSUCH");
+  EXPECT_EQ(none.GetRecord(0), -1);
+}
+
+// ---------------------------------------------------------------------------
 // Trees of every shape: every record once, in key order, after reopening.
 
 void CheckWalk(ZQDBMdx& ix, int n, int dups, int width, bool backwards) {

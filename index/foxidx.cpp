@@ -76,12 +76,14 @@ void TrimTagName(ZQString& name) {
   name.SetLength(n);
 }
 
-// The header offset of the tag `name` (any case) in `taglist`, -1 if none.
+// The header offset of the tag `name` (any case, trailing blanks aside) in
+// `taglist`, -1 if none.
 int32_t FindTag(ZQDBFoxIndex* taglist, const char* name) {
-  ZQString key;
+  ZQString wanted(name), key;
+  TrimTagName(wanted);
   for (int32_t r = taglist->FirstKey(key); r != -1; r = taglist->NextKey(key)) {
     TrimTagName(key);
-    if (ZQGlob::stricmp(key.c_str(), name) == 0) return r + 1;
+    if (ZQGlob::stricmp(key.c_str(), wanted.c_str()) == 0) return r + 1;
   }
   return -1;
 }

@@ -9,7 +9,7 @@ JOBS       ?= $(shell nproc 2>/dev/null || echo 2)
 
 # What each package is for: see README.md, "Dependencies".
 PACKAGES = cmake ninja-build g++ clang libclang-rt-14-dev libgtest-dev python3 \
-           python3-dbfread python3-dbf libdbd-xbase-perl shapelib gdal-bin pgdbf dpkg-dev
+           python3-dbfread python3-dbf libdbd-xbase-perl libxbase64-dev shapelib gdal-bin pgdbf dpkg-dev
 
 .PHONY: all setup build demo test test-sanitize bench package clean
 

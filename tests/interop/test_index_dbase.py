@@ -1,0 +1,316 @@
+"""dBASE index files against independent programs.
+
+1. NDX files and MDX tags that `zqdb convert --index` writes over character
+   fields, from one leaf to trees of four and more levels and of 100,000
+   keys, keys in random order with long runs of equal keys: Perl XBase
+   (XBase::Index) walks them in the order and with the record numbers that
+   `zqdb keys` gives, with one key per live record, and its seek lands on
+   the first record of every distinct key. Perl walks part of a tree without
+   an error when a header names an old root, so the counts are checked too.
+2. Append (no index option) to a table with two MDX tags: the new records'
+   keys are in both tags, for zqdb and for Perl.
+3. Numeric keys are 8-byte doubles, compared as bytes. Perl reads them from
+   an NDX file (whose key type word says character) and from an MDX tag as
+   the 8 bytes they are, not as numbers: it walks them in zqdb's order, which
+   is not value order, and its seek by those bytes finds every key.
+4. libxbase64 (a small program compiled here against libxbase64-dev): NDX
+   files that it builds over a table zqdb writes are walked by `zqdb keys`,
+   forwards and backwards, as libxbase64 walks them, and it walks zqdb's
+   deep NDX file both ways as zqdb does.
+"""
+
+import json
+import os
+import random
+import shutil
+import struct
+import subprocess
+import sys
+
+HERE = os.path.dirname(os.path.abspath(__file__))
+sys.path.insert(0, HERE)
+from common import Suite, run, workdir, ZQDB  # noqa: E402
+
+# Walks an index (argv: file, tag or "") and prints "W key recno" per key,
+# then seeks each key read from stdin and prints "S key recno" for the key
+# found there; "-" for none. Keys lose their trailing blanks; with a third
+# argument "hex" keys are read and printed as the hex of their bytes.
+PERL = r'''
+use strict; use XBase::Index;
+my ($file, $tag, $form) = @ARGV;
+my $hex = ($form // "") eq "hex";
+my $ix = XBase::Index->new($file, length $tag ? (tag => $tag) : ()) or die XBase::Index->errstr;
+sub show { my $k = shift; return "-" unless defined $k;
+           return unpack("H*", $k) if $hex; $k =~ s/ +$//; $k }
+$ix->prepare_select;
+while (my ($k, $r) = $ix->fetch) { print "W\t", show($k), "\t$r\n" }
+while (my $k = <STDIN>) {
+    chomp $k;
+    $k = pack("H*", $k) if $hex;
+    $ix->prepare_select_eq($k) or die $ix->errstr;
+    my ($f, $r) = $ix->fetch;
+    print "S\t", show($f), "\t", $r // 0, "\n";
+}
+'''
+
+# (label, records, field width, distinct keys, fewest MDX and NDX levels)
+# A key of 100 bytes leaves 9 entries to an MDX node and 4 to an NDX node,
+# so a few thousand records make a deep tree. libxbase64 reads the entries
+# of an NDX node 8 + key length bytes apart, whatever the entry length in the
+# header, and takes a node for 1024 bytes when its keys fill more than 496 of
+# the 512: the widths here are those that it reads right.
+TREES = [
+    ("one leaf", 12, 8, 5, 1, 1),
+    ("four levels", 4000, 100, 1500, 4, 6),
+    ("100,000 keys", 100_000, 32, 30_000, 4, 5),
+]
+# The four-level table gets a second tag, over a field of a few values in
+# long runs, and then records appended to it.
+APPEND_TO, APPENDED = "four levels", 1500
+STATUS = ["open", "closed", "held", "void", ""]
+ALPHABET = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789 -./"
+
+s = Suite("index_dbase")
+
+
+def key_pool(rng, width, distinct):
+    """`distinct` keys of up to `width` bytes, without leading or trailing
+    blanks, many sharing a long prefix so that they differ late."""
+    stems = ["".join(rng.choice(ALPHABET) for _ in range(width * 2 // 3)).strip() for _ in range(3)]
+    pool = {""}  # a blank key sorts first
+    while len(pool) < distinct:
+        tail = "".join(rng.choice(ALPHABET) for _ in range(rng.randrange(1, width // 3 + 2)))
+        pool.add((rng.choice(stems + [""]) + tail)[:width].strip())
+    return sorted(pool)
+
+
+def draw(rng, pool, n):
+    """n keys from the pool in random order; a tenth of them one key, so that
+    runs of equal keys span several nodes."""
+    common = pool[len(pool) // 2]
+    return [common if rng.random() < 0.1 else rng.choice(pool) for _ in range(n)]
+
+
+def write_rows(path, header, rows):
+    with open(path, "w", encoding="ascii", newline="") as f:
+        f.write(header + "\r\n")
+        f.writelines(",".join(map(str, r)) + "\r\n" for r in rows)
+
+
+def status(recno):
+    return STATUS[recno * 7 % len(STATUS)]
+
+
+def write_csv(path, keys, first_id):
+    write_rows(path, "ID,K,G", ((first_id + i, k, status(first_id + i)) for i, k in enumerate(keys)))
+
+
+def must(cmd):
+    rc, out, err = run(cmd)
+    if rc != 0:
+        raise AssertionError("%s: exit %d: %s" % (os.path.basename(cmd[0]), rc, err.strip()[-400:]))
+    return out
+
+
+def zq_keys(table, index, *opts):
+    out = must([ZQDB, "keys", table, "--index", index, "--format", "jsonl", *opts])
+    return [(r["key"], r["recno"]) for r in map(json.loads, out.splitlines())]
+
+
+def perl_walk(index, tag="", seek=(), form=""):
+    """(walk, seeks) as Perl XBase reads them: lists of (key, recno)."""
+    p = subprocess.run(["perl", "-e", PERL, index, tag, form], input="".join(k + "\n" for k in seek).encode(),
+                       capture_output=True, timeout=120)
+    if p.returncode != 0:
+        raise AssertionError("perl: " + p.stderr.decode(errors="replace")[-400:])
+    walk, found = [], []
+    for line in p.stdout.decode("latin-1").splitlines():
+        kind, key, recno = line.split("\t")
+        (walk if kind == "W" else found).append((key, int(recno)))
+    return walk, found
+
+
+def levels(index, tag=None):
+    """The depth of an NDX file (tag None) or an MDX tag, down its first
+    entries. NDX: header root block at 0; node: count at 0, entries from 4,
+    an entry's child block first (0 in a leaf). MDX: tag table from 544 in
+    32-byte entries (header block, name); tag header: root block at 0, entry
+    size at 18; node: count at 0, entries from 8, child block first, and
+    behind the last entry a word that is 0 in a leaf."""
+    with open(index, "rb") as f:
+        data = f.read()
+    le32 = lambda at: struct.unpack_from("<I", data, at)[0]  # noqa: E731
+    if tag is None:
+        node, depth = le32(0) * 512, 1
+        while le32(node + 4):
+            node, depth = le32(node + 4) * 512, depth + 1
+        return depth
+    at = next(544 + 32 * i for i in range(47) if data[548 + 32 * i:559 + 32 * i].rstrip(b"\0") == tag.encode())
+    header = le32(at) * 512
+    entry = struct.unpack_from("<H", data, header + 18)[0]
+    node, depth = le32(header) * 512, 1
+    while le32(node + 8 + le32(node) * entry):
+        node, depth = le32(node + 8) * 512, depth + 1
+    return depth
+
+
+def first_records(walk):
+    """The first record number of each distinct key of a walk."""
+    first = {}
+    for k, r in walk:
+        first.setdefault(k, r)
+    return first
+
+
+def check_index(label, table, index, tag, recs):
+    """zqdb's walk is `recs` (id -> key) in key order, one key per record;
+    Perl walks it alike and its seek finds each distinct key's first record."""
+    name = tag or index
+    zq = zq_keys(table, name)
+    s.check(label + " zqdb count", len(zq) == len(recs), "%d keys, %d records" % (len(zq), len(recs)))
+    s.check(label + " zqdb key order", [k for k, _ in zq] == sorted(recs.values()))
+    s.check(label + " zqdb records", sorted(zq) == sorted((k, r) for r, k in recs.items()))
+    first = first_records(zq)
+    walk, found = perl_walk(index, tag or "", seek=list(first))
+    s.check(label + " Perl walk", walk == zq, "%d keys from Perl, %d from zqdb; first difference at %s" % (
+        len(walk), len(zq), next((i for i, (a, b) in enumerate(zip(walk, zq)) if a != b), min(len(walk), len(zq)))))
+    bad = [(k, r, f) for (k, r), f in zip(first.items(), found) if f != (k, r)]
+    s.check(label + " Perl seek", len(found) == len(first) and not bad, "%d of %d seeks wrong: %s" % (
+        len(bad), len(first), bad[:3]))
+
+
+def convert(d, name, keys, *opts):
+    csv, table = os.path.join(d, name + ".csv"), os.path.join(d, name + ".dbf")
+    write_csv(csv, keys, 1)
+    must([ZQDB, "convert", csv, table, "--no-progress", *opts])
+    return table
+
+
+# --- 1 and 2: character keys ------------------------------------------------
+
+def character_trees(d, tool):
+    for label, n, width, distinct, mdx_levels, ndx_levels in TREES:
+        with s.case(label):
+            rng = random.Random(n)
+            pool = key_pool(rng, width, distinct)
+            keys = draw(rng, pool, n)
+            ndx = os.path.join(d, "k%d.ndx" % n)
+            more = ["--index", "G=G"] if label == APPEND_TO else []
+            table = convert(d, "t%d" % n, keys, "--schema", "ID N(7), K C(%d), G C(6)" % width,
+                            "--index", "K=K", "--index", ndx + "=K", *more)
+            recs = dict(enumerate(keys, 1))
+            mdx = table[:-4] + ".mdx"
+            got = (levels(mdx, "K"), levels(ndx))
+            s.check(label + " depth", got[0] >= mdx_levels and got[1] >= ndx_levels,
+                    "MDX %d, NDX %d levels" % got)
+            check_index(label + " MDX", table, mdx, "K", recs)
+            check_index(label + " NDX", table, ndx, None, recs)
+            if tool:
+                same_as_xbase64(label + " NDX", tool, table, ndx)
+            if label == APPEND_TO:
+                append(d, table, rng, pool, recs)
+
+
+def append(d, table, rng, pool, recs):
+    """Records added by --mode append go into every MDX tag."""
+    first = len(recs) + 1
+    keys = draw(rng, pool + ["new %d" % i for i in range(100)], APPENDED)
+    csv = os.path.join(d, "more.csv")
+    write_csv(csv, keys, first)
+    must([ZQDB, "convert", csv, table, "--mode", "append", "--no-progress"])
+    recs.update(enumerate(keys, first))
+    mdx = table[:-4] + ".mdx"
+    check_index("append K", table, mdx, "K", recs)
+    check_index("append G", table, mdx, "G", {r: status(r) for r in recs})
+
+
+# --- 3: numeric keys ----------------------------------------------------------
+
+NUMBERS = [3, -2.5, 0, 1, 1000000, -7, 0.5, 2, 3, -0.25, 100]
+
+
+def numeric_keys(d):
+    """zqdb's walk is in the order of the doubles' bytes, little-endian, not
+    in value order. Perl reads the keys of an NDX file (whose key type word
+    says character) and of an MDX tag as the 8 bytes they are: it walks them
+    in zqdb's order, and a seek by those bytes finds each key."""
+    with s.case("numeric keys"):
+        ndx = os.path.join(d, "n.ndx")
+        table = convert(d, "num", NUMBERS, "--schema", "ID N(3), K N(9,2)", "--index", "NK=K",
+                        "--index", ndx + "=K")
+        want = sorted((struct.pack("<d", v).hex(), r) for r, v in enumerate(NUMBERS, 1))
+        s.check("numeric order is not value order", [struct.unpack("<d", bytes.fromhex(k))[0] for k, _ in want]
+                != sorted(NUMBERS))
+        for index, tag in ((ndx, ""), (table[:-4] + ".mdx", "NK")):
+            zq = [(struct.pack("<d", float(k)).hex(), r) for k, r in zq_keys(table, tag or index)]
+            s.check("numeric zqdb walk " + (tag or "NDX"), zq == want, repr(zq))
+            first = first_records(want)
+            walk, found = perl_walk(index, tag, seek=list(first), form="hex")
+            s.check("numeric Perl walk " + (tag or "NDX"), walk == want, repr(walk))
+            s.check("numeric Perl seek " + (tag or "NDX"), found == list(first.items()), repr(found))
+
+
+# --- 4: NDX files of libxbase64 ----------------------------------------------
+
+# Key lengths are multiples of 4, as above: libxbase64 also writes the
+# entries of other key lengths closer together than its header says. It sizes
+# a SUBSTR key now 3, now 4 bytes for the same table, so there is none here.
+XB_ROWS = [("bob", 3, "2001-02-03"), ("al", 1, "1999-12-31"), ("bob", 2, "1900-01-01"), ("cy", -5.5, ""),
+           ("", 0, "2024-02-29"), ("Al", 1e5, "1970-01-01"), ("al", -0.5, "2000-02-29")]
+XB_SCHEMA = "NAME C(8), QTY N(9,2), BORN D"
+XB_CASES = [  # (expression, schema, rows, fewest levels)
+    ("NAME", XB_SCHEMA, XB_ROWS, 1),
+    ("NAME+DTOS(BORN)", "NAME C(4), QTY N(9,2), BORN D", XB_ROWS, 1),
+    ("QTY", XB_SCHEMA, XB_ROWS, 1),
+    # libxbase64 keeps a date as its 8 characters YYYYMMDD in a character
+    # index, and zqdb reads a date key as a double: only the order and the
+    # record numbers are compared.
+    ("BORN", XB_SCHEMA, XB_ROWS, 1),
+    ("NAME", XB_SCHEMA, [("".join(random.Random(i).choices("abcdefgh", k=i % 8 + 1)), i, "") for i in range(20000)], 3),
+]
+
+
+def xbase64_tool(d):
+    """The libxbase64 program, compiled into d; None when that fails."""
+    tool = os.path.join(d, "xbase64_ndx")
+    with s.case("libxbase64 tool"):
+        must(["g++", "-std=c++17", "-O1", "-w", os.path.join(HERE, "xbase64_ndx.cpp"), "-o", tool, "-lxbase64"])
+        return tool
+    return None
+
+
+def same_as_xbase64(label, tool, table, ndx, keys=None):
+    """libxbase64 walks `ndx` forwards and backwards with the record numbers
+    of zqdb's walks; with `keys` (recno - 1 -> key) zqdb's keys are those."""
+    for direction in ("forwards", "backwards"):
+        theirs = [int(r) for r in must([tool, "walk", table, ndx, direction]).split()]
+        ours = zq_keys(table, ndx, *(["--reverse"] if direction == "backwards" else []))
+        s.check("%s libxbase64 %s" % (label, direction), [r for _, r in ours] == theirs,
+                "zqdb %s, libxbase64 %s" % (ours[:10], theirs[:10]))
+        if keys:
+            s.check("%s libxbase64 %s keys" % (label, direction),
+                    [k for k, _ in ours] == [keys[r - 1] for r in theirs], repr(ours[:10]))
+
+
+def libxbase64_files(d, tool):
+    table, ndx, csv = (os.path.join(d, "xb" + ext) for ext in (".dbf", ".ndx", ".csv"))
+    for expr, schema, rows, depth in XB_CASES:
+        label = "libxbase64's %s, %d records" % (expr, len(rows))
+        with s.case(label):
+            write_rows(csv, "NAME,QTY,BORN", rows)
+            must([ZQDB, "convert", csv, table, "--schema", schema, "--no-progress"])
+            must([tool, "index", table, ndx, expr])
+            s.check(label + " depth", levels(ndx) >= depth, "%d levels" % levels(ndx))
+            same_as_xbase64(label, tool, table, ndx, [r[0] for r in rows] if expr == "NAME" else None)
+
+
+if shutil.which("perl") is None:
+    print("index_dbase: perl missing")
+    sys.exit(1)
+with workdir() as d:
+    xbase64 = xbase64_tool(d)
+    character_trees(d, xbase64)
+    numeric_keys(d)
+    if xbase64:
+        libxbase64_files(d, xbase64)
+s.done()

@@ -777,9 +777,10 @@ ZQDBFoxNode::Outcome ZQDBFoxNode::Insert(const uint8_t* key, uint32_t record) {
     InsertEntry(LowerBound(key, record, true, true), key, record, 0);
     return kDone;
   }
-  // Compact interior entries carry the greatest key's record number: equal
-  // keys stay in record order across leaves.
-  int i = LowerBound(key, record, compact, false);
+  // Equal keys stay in record order across leaves: compact interior entries
+  // carry the greatest key's record number; non-compact ones don't, and an
+  // equal key goes on to the child behind, where the later records are.
+  int i = compact ? LowerBound(key, record, true, false) : LowerBound(key, 0, false, true);
   if (i == keyCount) {  // above everything below this node: the last entry takes the key
     i = keyCount - 1;
     uint8_t* e = raw + kHeader + i * EntrySize();
@@ -1063,7 +1064,7 @@ bool ZQDBFoxNode::ChildSplit(const uint8_t* key, uint32_t record) {
   uint32_t midRecord = below->RecordAt(m);
   InsertEntry(current, midKey, midRecord, newPlace);
   int c = memcmp(midKey, key, size_t(keyLength));
-  bool toLower = c > 0 || (c == 0 && (!compact || midRecord >= record));
+  bool toLower = c > 0 || (c == 0 && compact && midRecord >= record);
   if (toLower) {
     below->KeepRange(0, m + 1);
     below->where = newPlace;

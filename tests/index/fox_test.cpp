@@ -199,6 +199,8 @@ TEST(FoxCompactLeaf, HoldsKeysAsOtherProgramsReadThem) {
       // A B after A: the shared blank lies in A's trailing blanks, so it is stored.
       {"A then A B", 10, {"A", "A B"}, 479, {1, 0, 0x90, 2, 0, 0x71}, " BA"},
       {"a key put before the first", 10, {"ABCDEFGHIJ", "ABC"}, 472, {2, 0, 0x70, 1, 0, 3}, "DEFGHIJABC"},
+      // Counts are held to their 7 bits: 73 bytes of the first key are stored.
+      {"counts beyond their masks", 200, {"A", "A"}, 407, {1, 0, 0, 0xFE, 2, 0, 0x24, 0xFF}, "A" + std::string(72, ' ')},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.what);
@@ -326,13 +328,18 @@ void CheckWalk(ZQDBFoxIndex& ix, const std::vector<std::string>& keyOf) {
   std::vector<char> seen(n, 0);
   ZQString key;
   std::string last;
+  int32_t lastRecord = -1;
   size_t count = 0;
   for (int32_t r = ix.FirstKey(key); r != -1; r = ix.NextKey(key), ++count) {
     ASSERT_TRUE(r >= 0 && size_t(r) < n && !seen[size_t(r)]) << r;
     seen[size_t(r)] = 1;
     ASSERT_EQ(Text(key), keyOf[size_t(r)]);
     ASSERT_LE(last, Text(key));
+    if (last == Text(key)) {
+      ASSERT_GT(r, lastRecord);  // equal keys in record order
+    }
     last = Text(key);
+    lastRecord = r;
   }
   ASSERT_EQ(count, n);
   count = 0;
@@ -344,7 +351,7 @@ void CheckWalk(ZQDBFoxIndex& ix, const std::vector<std::string>& keyOf) {
   }
   ASSERT_EQ(count, n);
   for (size_t i = 0; i < n; i += 1 + n / 500) {
-    ZQString q(keyOf[i].data(), int32_t(keyOf[i].size()));
+    ZQString q(keyOf[i].data(), 8);  // without its trailing blanks
     int32_t r = ix.FindKey(q, true);
     ASSERT_NE(r, -1) << keyOf[i];
     ASSERT_EQ(keyOf[size_t(r)], keyOf[i]);
@@ -561,6 +568,8 @@ TEST(FoxDamage, AMissingFileOrTagIsNotOk) {
   EXPECT_FALSE(ZQDBFoxIndex(base.c_str(), "NAME", taglist).OK());
   EXPECT_EQ(taglist, nullptr);
   EXPECT_FALSE(ZQDBFoxIndex("unused", ScratchPath("none.idx").c_str(), taglist).OK());
+  KeyField wide(ZQDBFoxIndex::kMaxKeyLength + 1, true);
+  EXPECT_FALSE(ZQDBFoxIndex("unused", ScratchPath("wide.idx").c_str(), wide.fields, wide.def, taglist).OK());
   // A CDX that is no index at all: not OK, and no tag list is kept.
   tests::WriteScratch("missing.cdx", Bytes(100, 0x41));
   EXPECT_FALSE(ZQDBFoxIndex(base.c_str(), "NAME", taglist).OK());

@@ -2,7 +2,8 @@
 # make bench: bench/run.sh BUILD_DIR/zqdb [SIZE...]
 # Times zqdb's read to CSV against pgdbf and python3-dbfread on generated
 # tables of 100,000, 1,000,000 and 4,000,000 records (kept in bench/data/),
-# then convert (CSV and DBF to DBF) against ogr2ogr and python3-dbf.
+# then convert (CSV and DBF to DBF) against ogr2ogr and python3-dbf, memo
+# tables, and a convert that builds an MDX tag against sort and Perl XBase.
 set -e
 if [ $# -lt 1 ] || [ ! -x "$1" ]; then
   echo "usage: bench/run.sh PATH_TO_ZQDB [SIZE...]" >&2
@@ -11,3 +12,4 @@ fi
 /usr/bin/python3 "$(dirname "$0")/bench.py" "$@"
 /usr/bin/python3 "$(dirname "$0")/bench_convert.py" "$1"
 /usr/bin/python3 "$(dirname "$0")/bench_memo.py" "$1"
+/usr/bin/python3 "$(dirname "$0")/bench_index.py" "$1"

@@ -7,6 +7,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <string>
+#include <vector>
 
 #include "engine/endpoints.h"
 #include "engine/indexes.h"
@@ -23,12 +24,21 @@ class TableTarget : public Target {
         opts_(opts),
         existing_(opts.mode != 0 && access(path.c_str(), F_OK) == 0) {}
 
+  ~TableTarget() override {
+    // A run that didn't finish leaves no index file it made outside the
+    // scratch directory (NDX and IDX files go where they are named).
+    if (!finished_)
+      for (const std::string& made : made_index_files_) unlink(made.c_str());
+  }
+
   bool AddsToExisting() const override { return existing_; }
   bool KeepsBlankLogicals() const override { return false; }
 
   bool Open(std::string* error) override {
     if (existing_) before_ = CountRecords();
     if (!AddIndexDefinitions(spoke_.get(), opts_.table, existing_, error)) return false;
+    for (const IndexOption& o : opts_.table.indexes)
+      if (o.name.find('.') != std::string::npos && access(o.name.c_str(), F_OK) != 0) made_index_files_.push_back(o.name);
     if (existing_) WarnStaleIndexes();
     if (opts_.mode == 0 && !staging_.Begin(path_, &work_, error)) return false;
     return Target::Open(error);
@@ -38,7 +48,7 @@ class TableTarget : public Target {
     ZQString v;
     spoke_->GetOption("version", v);
     if (!VerifyTable(work_, connector_, v.c_str(), opts_.table, before_ + added, error)) return false;
-    if (opts_.mode != 0) return true;
+    if (opts_.mode != 0) return finished_ = true;
     bool staged_mdx = HasSibling(work_, "mdx"), staged_cdx = HasSibling(work_, "cdx");
     if (!staging_.Commit(error)) return false;
     // An MDX or CDX file of the target's name that the new table didn't
@@ -46,7 +56,7 @@ class TableTarget : public Target {
     // for this table's and get its keys added to the old ones.
     if (!staged_mdx) RemoveOldIndex("mdx");
     if (!staged_cdx) RemoveOldIndex("cdx");
-    return true;
+    return finished_ = true;
   }
 
  private:
@@ -103,6 +113,8 @@ class TableTarget : public Target {
 
   TableConnector connector_;
   WriteOptions opts_;
+  std::vector<std::string> made_index_files_;
+  bool finished_ = false;
   bool existing_;
   int64_t before_ = 0;
   Staging staging_;

@@ -237,6 +237,11 @@ int WriteKeys(ZQImport* spoke, const KeysOptions& opts) {
     fprintf(stderr, "zqdb: --seek: %s is no number or date, as the keys of this index are\n", opts.seek.c_str());
     return 2;
   }
+  // A key that names a record past the table's end shows an index that
+  // doesn't belong to the table as it is: the keys are printed, and the
+  // run ends with a warning and exit status 1.
+  int64_t records = spoke->EstimateRecordCount();
+  int64_t beyond = 0;
   OutBuf out(STDOUT_FILENO);
   if (!opts.jsonl) out.Put("key,recno\n");
   int32_t r;
@@ -249,8 +254,14 @@ int WriteKeys(ZQImport* spoke, const KeysOptions& opts) {
     out.Put(opts.jsonl ? ", \"recno\": " : ",");
     out.PutInt(int64_t(r) + 1);
     out.Put(opts.jsonl ? "}\n" : "\n");
+    if (r >= records) ++beyond;
     r = opts.reverse ? walk->Prev(key) : walk->Next(key);
   }
   if (!out.Flush()) return Fail("cannot write the output");
+  if (beyond > 0) {
+    Warn(std::to_string(beyond) + " key(s) name records past the table's last (" + std::to_string(records) +
+         "): the index doesn't match the table");
+    return 1;
+  }
   return 0;
 }

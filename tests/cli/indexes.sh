@@ -56,6 +56,10 @@ expect_run 2 keys p.dbf --index NAME --reverse && expect_err "zqdb: an MDX tag i
 expect_run 1 keys p.dbf --index NOPE && expect_err "zqdb: no index NOPE could be opened (the table's indexes: NAME, BYC)"
 expect_run 2 keys p.dbf && expect_err "zqdb: keys needs --index NAME"
 
+# A damaged NDX: the first key's record number (block 1, entry 0) is 65536.
+cp q.ndx bad.ndx && printf '\x00\x00\x01\x00' | dd of=bad.ndx bs=1 seek=520 conv=notrunc 2>/dev/null
+expect_run 1 keys p.dbf --index "$WORK/bad.ndx" && err_has "name records past the table's last (4): the index doesn't match the table"
+
 # --- Appends reach every tag --------------------------------------------------
 expect_run 0 convert more.csv p.dbf --mode append --no-progress
 expect_run 0 keys p.dbf --index NAME && expect_out "abe,5"
@@ -76,6 +80,9 @@ expect_run 1 convert people.csv x.dbf --index "a.idx=NAME" --no-progress && expe
 expect_run 1 convert people.csv x.dbf --index A=NAME --index a=CITY --no-progress && expect_err "index A is given twice"
 expect_run 1 convert more.csv p.dbf --mode append --index A=NAME --no-progress && expect_err "zqdb: --index makes the indexes of a new table"
 if [ -e x.dbf ]; then fail "a refused table was left behind"; else PASSED=$((PASSED + 1)); fi
+printf 'ID,K\n1,3\n2,x\n' >bad.csv
+expect_run 1 convert bad.csv x.dbf --schema "ID N(3), K N(4)" --index "$WORK/k.ndx=ID" --no-progress
+if [ -e k.ndx ]; then fail "a failed run left its NDX file"; else PASSED=$((PASSED + 1)); fi
 
 # --- A replaced table takes its old MDX file with it ---------------------------
 cp p.dbf r.dbf && cp p.mdx r.mdx

@@ -44,12 +44,6 @@ bool WriteAt(int fd, int32_t at, const void* buffer, uint32_t n) {
   return _write(fd, buffer, n) == int32_t(n);
 }
 
-// Opens an existing index read-write, or read-only where the file allows no
-// more (walking needs no write).
-int OpenExisting(const char* path) {
-  int fd = _open(path, kRtReadWrite | kRtBinary);
-  return fd >= 0 ? fd : _open(path, kRtReadOnly | kRtBinary);
-}
 
 // The extension of `name` into `ext` ("" for none). False for a name too long.
 bool ExtensionOf(const char* name, char* ext) {
@@ -126,7 +120,7 @@ ZQDBFoxIndex::ZQDBFoxIndex() : ZQDBIndexBase() {}
 
 ZQDBFoxIndex::ZQDBFoxIndex(const char* path) : ZQDBIndexBase() {
   headerWhere = 0;
-  fd = OpenExisting(path);
+  OpenExisting(path);
   ReadHeader();
   if (root != nullptr) static_cast<ZQDBFoxNode*>(root)->SetCDXAttr();
 }
@@ -139,7 +133,7 @@ ZQDBFoxIndex::ZQDBFoxIndex(const char* basepath, const char* name, ZQDBFoxIndex*
   }
   if (ext[0] != '\0') {  // an IDX file
     headerWhere = 0;
-    fd = OpenExisting(name);
+    OpenExisting(name);
     ReadHeader();
     return;
   }
@@ -155,7 +149,7 @@ ZQDBFoxIndex::ZQDBFoxIndex(const char* basepath, const char* name, ZQDBFoxIndex*
     return;
   }
   headerWhere = at;
-  fd = OpenExisting(path);
+  OpenExisting(path);
   ReadHeader();
 }
 
@@ -215,6 +209,18 @@ ZQDBFoxIndex::~ZQDBFoxIndex() {
   if (dirty) Flush();
 }
 
+// Read-write, or read-only where the file allows no more: walking needs no
+// write, and AddKey then refuses.
+void ZQDBFoxIndex::OpenExisting(const char* path) {
+  fd = _open(path, kRtReadWrite | kRtBinary);
+  readOnly = fd < 0;
+  if (readOnly) fd = _open(path, kRtReadOnly | kRtBinary);
+}
+
+bool ZQDBFoxIndex::AddKey(ZQString& key, int32_t record) {
+  return !readOnly && ZQDBIndexBase::AddKey(key, record);
+}
+
 bool ZQDBFoxIndex::Fail(const char* why) {
   reason = why;
   ok = false;
@@ -248,6 +254,9 @@ void ZQDBFoxIndex::CreateTag(const char* path, const char* name, int32_t length,
     _close(fd);
     fd = -1;
     if (*reason != '\0' || !OpenTagList(path, taglist)) return;
+  } else if (!taglist->OK()) {
+    Fail("the CDX file's tag list is damaged");
+    return;
   } else if (FindTag(taglist, name) >= 0) {
     Fail("the CDX file has a tag of that name already");
     return;

@@ -20,9 +20,9 @@ const char* SkipBlanksAndCommas(const char* p) {
 // type, 2 the text type.
 constexpr int kDateType = 0, kNumericType = 1, kTextType = 2;
 
-// Most blocks any index kind packs into 512 bytes of file: a compact Fox
-// leaf holds at least 3 bytes per key.
-constexpr int64_t kKeysPer512 = 512 / 3 + 1;
+// Most keys any index kind packs into 512 bytes of file: a compact leaf
+// entry takes at least one byte.
+constexpr int64_t kKeysPer512 = 512;
 
 }  // namespace
 

@@ -48,13 +48,13 @@ test: build
 	ctest --test-dir $(BUILD) --output-on-failure -j $(JOBS)
 	$(MAKE) --no-print-directory test-sanitize
 
-# Unit tests under AddressSanitizer and UndefinedBehaviorSanitizer, and every
-# libFuzzer target for a bounded time, all built with clang.
+# Unit and CLI tests under AddressSanitizer and UndefinedBehaviorSanitizer, and
+# every libFuzzer target for a bounded time, all built with clang.
 test-sanitize: setup
 	CXX=clang++ cmake -S . -B $(SAN_BUILD) -G Ninja -DZQ_SANITIZE=ON -DZQ_FUZZ=ON \
 	  -DZQ_FUZZ_TIME=$(FUZZ_TIME) -DCMAKE_BUILD_TYPE=Debug >/dev/null
 	ninja -C $(SAN_BUILD) -j $(JOBS)
-	ctest --test-dir $(SAN_BUILD) --output-on-failure -L 'unit|fuzz-smoke' -j $(JOBS)
+	ctest --test-dir $(SAN_BUILD) --output-on-failure -L 'unit|cli|fuzz-smoke' -j $(JOBS)
 
 bench: build
 	bench/run.sh $(BUILD)/zqdb

@@ -378,7 +378,7 @@ BATCHERR ZQFromCsv::GetRecord(int32_t n) {
 
 namespace {
 
-void DeleteCsv(ZQImport* s) { delete s; }
+void DeleteCsv(void*, ZQImport* s) { delete s; }
 
 // Column types from the fields of the table the records go to.
 std::vector<SchemaField> HintsOf(ZQRecord& layout) {

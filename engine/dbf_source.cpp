@@ -125,13 +125,13 @@ bool ResolveConnector(const std::string& type, TableConnector* out, std::string*
 }
 
 SourcePtr NewTableSource(const TableConnector& c) {
-  SourcePtr p(c.factories.new_source(c.spoke_def), SourceDeleter{c.factories.delete_source});
+  SourcePtr p(c.factories.NewSource(c.spoke_def), SourceDeleter{c.factories.delete_source, c.factories.fns[1]});
   if (p) ApplyOptionText(p.get(), c.def->option_text);
   return p;
 }
 
 TargetPtr NewTableTarget(const TableConnector& c) {
-  TargetPtr p(c.factories.new_target(c.spoke_def), TargetDeleter{c.factories.delete_target});
+  TargetPtr p(c.factories.NewTarget(c.spoke_def), TargetDeleter{c.factories.delete_target, c.factories.fns[3]});
   if (p) ApplyOptionText(p.get(), c.def->option_text);
   return p;
 }

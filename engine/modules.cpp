@@ -14,7 +14,43 @@
 #include "connector/trailer.h"
 #include "host/endian.h"
 
+// The connector classes of the class stem "Dbase", declared and never
+// defined here: the engine needs their names for the factories' exact types,
+// never their members.
+class ZQFromDbase;
+class ZQToDbase;
+
 namespace {
+
+// Calls a module's factories through pointers of their own types. A
+// connector's class has the framework's ZQImport or ZQExport as its first
+// base, so the object and its base share an address.
+template <class From, class To>
+struct TypedCalls {
+  static ZQImport* NewSource(void* fn, const ZQSpokeDef& def) {
+    return reinterpret_cast<ZQImport*>(reinterpret_cast<From* (*)(const ZQSpokeDef&)>(fn)(def));
+  }
+  static void DeleteSource(void* fn, ZQImport* s) {
+    reinterpret_cast<void (*)(From*)>(fn)(reinterpret_cast<From*>(s));
+  }
+  static ZQExport* NewTarget(void* fn, const ZQSpokeDef& def) {
+    return reinterpret_cast<ZQExport*>(reinterpret_cast<To* (*)(const ZQSpokeDef&)>(fn)(def));
+  }
+  static void DeleteTarget(void* fn, ZQExport* t) { reinterpret_cast<void (*)(To*)>(fn)(reinterpret_cast<To*>(t)); }
+};
+
+// The class stems whose factories zqdb can call, with their typed calls.
+struct StemCalls {
+  const char* stem;
+  ZQImport* (*new_source)(void*, const ZQSpokeDef&);
+  void (*delete_source)(void*, ZQImport*);
+  ZQExport* (*new_target)(void*, const ZQSpokeDef&);
+  void (*delete_target)(void*, ZQExport*);
+};
+using DbaseCalls = TypedCalls<ZQFromDbase, ZQToDbase>;
+const StemCalls kStemCalls[] = {
+    {"Dbase", DbaseCalls::NewSource, DbaseCalls::DeleteSource, DbaseCalls::NewTarget, DbaseCalls::DeleteTarget},
+};
 
 // No module carries more definitions than this; a larger count is damage.
 constexpr uint32_t kMaxDefinitions = 1024;
@@ -205,6 +241,14 @@ const ConnectorDef* ModuleRegistry::Default() const {
 }
 
 bool ModuleRegistry::Load(const ConnectorDef& def, SpokeFactories* out, std::string* error) {
+  const StemCalls* calls = nullptr;
+  for (const StemCalls& c : kStemCalls)
+    if (def.class_stem == c.stem) calls = &c;
+  std::string stem = def.class_stem;
+  if (calls == nullptr) {
+    *error = def.file + ": zqdb knows no connector classes of the class stem " + stem;
+    return false;
+  }
   void* handle = nullptr;
   for (const Loaded& l : loaded_)
     if (l.file == def.file) handle = l.handle;
@@ -217,9 +261,6 @@ bool ModuleRegistry::Load(const ConnectorDef& def, SpokeFactories* out, std::str
     }
     loaded_.push_back({def.file, handle});
   }
-  // The factories return the connector's own classes, whose first base is
-  // the framework's ZQImport or ZQExport: the pointers are the same.
-  std::string stem = def.class_stem;
   void* ns = dlsym(handle, ("NewFrom" + stem).c_str());
   void* ds = dlsym(handle, ("DeleteFrom" + stem).c_str());
   void* nt = dlsym(handle, ("NewTo" + stem).c_str());
@@ -228,9 +269,10 @@ bool ModuleRegistry::Load(const ConnectorDef& def, SpokeFactories* out, std::str
     *error = def.file + " lacks the factories of " + stem;
     return false;
   }
-  out->new_source = reinterpret_cast<ZQImport* (*)(const ZQSpokeDef&)>(ns);
-  out->delete_source = reinterpret_cast<void (*)(ZQImport*)>(ds);
-  out->new_target = reinterpret_cast<ZQExport* (*)(const ZQSpokeDef&)>(nt);
-  out->delete_target = reinterpret_cast<void (*)(ZQExport*)>(dt);
+  out->new_source = calls->new_source;
+  out->delete_source = calls->delete_source;
+  out->new_target = calls->new_target;
+  out->delete_target = calls->delete_target;
+  out->fns[0] = ns, out->fns[1] = ds, out->fns[2] = nt, out->fns[3] = dt;
   return true;
 }

@@ -27,12 +27,20 @@ enum class TrailerStatus { kNone, kOk, kDamaged };
 TrailerStatus ParseTrailer(const uint8_t* tail, size_t tail_size, uint64_t file_size,
                            std::vector<ConnectorDef>* out, std::string* why);
 
-// The factories of one loaded module.
+// The factories of one loaded module. They take and return the connector's
+// own classes (ZQFromDbase, ZQToDbase for the class stem "Dbase"), and a
+// function may only be called through a pointer of its own type: each call
+// goes through a wrapper typed for the class stem (modules.cpp), which
+// converts to and from the framework's ZQImport and ZQExport.
 struct SpokeFactories {
-  ZQImport* (*new_source)(const ZQSpokeDef&) = nullptr;
-  void (*delete_source)(ZQImport*) = nullptr;
-  ZQExport* (*new_target)(const ZQSpokeDef&) = nullptr;
-  void (*delete_target)(ZQExport*) = nullptr;
+  ZQImport* NewSource(const ZQSpokeDef& def) const { return new_source(fns[0], def); }
+  ZQExport* NewTarget(const ZQSpokeDef& def) const { return new_target(fns[2], def); }
+
+  ZQImport* (*new_source)(void* fn, const ZQSpokeDef&) = nullptr;
+  void (*delete_source)(void* fn, ZQImport*) = nullptr;
+  ZQExport* (*new_target)(void* fn, const ZQSpokeDef&) = nullptr;
+  void (*delete_target)(void* fn, ZQExport*) = nullptr;
+  void* fns[4] = {};  // the module's NewFrom, DeleteFrom, NewTo, DeleteTo
 };
 
 class ModuleRegistry {

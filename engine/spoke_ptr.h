@@ -1,6 +1,7 @@
 // Owning pointers to spokes. A spoke made by a module's factory is deleted
-// by that module's own delete function; a spoke of the engine's own by a
-// plain delete wrapped in one.
+// by that module's own delete function `fn`, called through `del` (a wrapper
+// of the function's own type); a spoke of the engine's own by a plain delete
+// wrapped in one, with no `fn`.
 #pragma once
 
 #include <memory>
@@ -8,15 +9,17 @@
 #include "host/zqspoke.h"
 
 struct SourceDeleter {
-  void (*del)(ZQImport*) = nullptr;
+  void (*del)(void* fn, ZQImport*) = nullptr;
+  void* fn = nullptr;
   void operator()(ZQImport* s) const {
-    if (s != nullptr) del(s);
+    if (s != nullptr) del(fn, s);
   }
 };
 struct TargetDeleter {
-  void (*del)(ZQExport*) = nullptr;
+  void (*del)(void* fn, ZQExport*) = nullptr;
+  void* fn = nullptr;
   void operator()(ZQExport* s) const {
-    if (s != nullptr) del(s);
+    if (s != nullptr) del(fn, s);
   }
 };
 using SourcePtr = std::unique_ptr<ZQImport, SourceDeleter>;

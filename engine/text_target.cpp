@@ -55,7 +55,7 @@ BATCHERR ZQToText::_CloseOutput(bool keep) {
 
 namespace {
 
-void DeleteText(ZQExport* s) { delete s; }
+void DeleteText(void*, ZQExport* s) { delete s; }
 
 std::unique_ptr<Target> MakeTextTarget(OutputFormat format, const std::string& path, const WriteOptions& opts,
                                        std::string* error) {

@@ -45,6 +45,9 @@ expect_run 1 convert badnum.csv out.dbf --schema "$SCHEMA" && expect_err 'zqdb: 
 absent out.dbf
 expect_run 1 convert baddate.csv out.dbf --schema "$SCHEMA" && expect_err 'zqdb: line 2, field BORN: "2020-02-30" is not a date'
 absent out.dbf
+printf 'WHEN\n2024-13-01T00:00:00\n' >badtime.csv
+expect_run 1 convert badtime.csv out.dbf --to 10 --schema "WHEN T" && expect_err 'zqdb: line 2, field WHEN: "2024-13-01T00:00:00" is not a date-time'
+absent out.dbf
 expect_run 1 convert badnum.csv out.dbf --schema "NAME X" && expect_err "zqdb: unknown type in the schema"
 expect_run 1 convert badnum.csv out.dbf --schema "NAME C(300)" && expect_err "zqdb: width outside 1 to 255"
 expect_run 1 convert badnum.csv out.dbf --schema "NOPE C(3)" && expect_err "zqdb: the schema names NOPE"
@@ -123,6 +126,8 @@ expect_run 2 convert good.csv out.dbf --key NAME && expect_err "zqdb: --key goes
 expect_run 2 convert good.csv out.dbf --mode merge && expect_err "zqdb: --mode takes replace, append or update"
 expect_run 2 convert good.csv out.dbf --to 11 && expect_err "zqdb: unknown dialect: 11"
 expect_run 1 convert good.csv out.dbf --mode update && expect_err "zqdb: update mode needs --key"
+expect_run 0 convert good.csv fixed.dbf --schema "QTY F(6,2)" && "$ZQDB" info fixed.dbf >"$OUT" &&
+  expect_out "  2    QTY         F        6    2"
 expect_run 1 convert good.csv out.csv --mode append && expect_err "zqdb: append and update modes need a table"
 absent out.dbf out.csv
 
@@ -155,6 +160,13 @@ absent notes2.dbf.missing
 if grep -q "NOTE" "$ERR"; then fail "a memo in dBASE IV warned: $(cat "$ERR")"; else PASSED=$((PASSED + 1)); fi
 "$ZQDB" cat notes2.dbf --format jsonl >"$OUT"
 expect_out "\"NOTE\":\"$long\""
+# --memo: never (the default) fails on a missing memo file, errors leaves the
+# field blank; always writes no memo at all.
+cp notes2.dbf nodbt.dbf
+expect_run 1 cat nodbt.dbf --memo never
+expect_run 0 cat nodbt.dbf --memo errors --format jsonl && expect_out '"NOTE":null'
+expect_run 0 convert notes.csv nomemo.dbf --to 2 --memo always && "$ZQDB" cat nomemo.dbf --format jsonl >"$OUT" &&
+  expect_out '{"NAME":"ann","NOTE":null,"OK":true}'
 # A table to a table of a dialect without memos.
 expect_run 0 convert notes2.dbf notes2to0.dbf --to 0
 err_has "zqdb: warning: field NOTE: memo folded to text of 254 bytes"

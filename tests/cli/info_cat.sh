@@ -53,5 +53,11 @@ NAME      AMT      BORN        OK
 Müller    12.50    2024-02-29  true
 a, "b"                         
 X
+# convert to .csv and .jsonl writes what cat prints.
+for f in csv jsonl; do
+  "$ZQDB" cat "$WORK/all.dbf" --codepage 850 --format $f >"$WORK/want"
+  expect_run 0 convert "$WORK/all.dbf" "$WORK/all.$f" --codepage 850 --no-progress
+  if cmp -s "$WORK/all.$f" "$WORK/want"; then PASSED=$((PASSED + 1)); else fail "convert to .$f differs from cat"; fi
+done
 
 finish

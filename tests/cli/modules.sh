@@ -18,6 +18,9 @@ expect_run 0 convert "$WORK/in.csv" "$WORK/fox.dbf" --type foxpro --no-progress
 expect_run 0 info "$WORK/fox.dbf" && expect_out "dialect:     6 (FoxPro)" && expect_out "version:     0xF5" &&
   expect_out "fox.fpt (FoxPro"
 expect_run 0 cat "$WORK/fox.dbf" --type foxpro --format jsonl && expect_out '"NAME":"ann"'
+# --to wins over the dialect of the definition --type picks.
+expect_run 0 convert "$WORK/in.csv" "$WORK/db4.dbf" --type vfoxpro --to 2 --no-progress &&
+  "$ZQDB" info "$WORK/db4.dbf" >"$OUT" && expect_out "dialect:     2 (dBASE IV)"
 expect_run 2 cat "$WORK/fox.dbf" --type nosuch && expect_err "no connector definition named nosuch"
 
 # Modules in a directory of our own: a copy of the real one is found there,
@@ -32,6 +35,11 @@ printf '\x00\x00\x00\x00' | dd of="$WORK/mods/libcut.so" bs=1 seek=$(($(stat -c 
 ZQDB_MODULE_PATH="$WORK/mods" expect_run 0 formats && expect_out "$WORK/mods/libgood.so" &&
   expect_err_any "libcut.so is skipped" && expect_err_any "libtext.so is skipped"
 expect_run 0 --modules "$WORK/mods" cat "$WORK/fox.dbf" --format jsonl && expect_out '"NAME":"ann"'
+# A loadable library with a valid trailer but none of the factories it names
+# (a second copy of the host library, which AddressSanitizer would report).
+mkdir -p "$WORK/nofac"
+{ cat "$(dirname "$ZQDB")/libzqhost.so"; tail -c 1212 "$module"; } >"$WORK/nofac/libnofac.so"
+ASAN_OPTIONS=${ASAN_OPTIONS:+$ASAN_OPTIONS:}detect_odr_violation=0 expect_run 1 --modules "$WORK/nofac" cat "$WORK/fox.dbf" && expect_err "zqdb: $WORK/nofac/libnofac.so lacks the factories of Dbase"
 
 # No module anywhere: a clear error, not a crash.
 mkdir -p "$WORK/lonely"

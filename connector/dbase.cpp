@@ -2,6 +2,7 @@
 // records into the host's fields.
 #include "connector/dbase.h"
 
+#include <cstdio>
 #include <cstring>
 
 #include "host/bytescan.h"
@@ -227,7 +228,17 @@ BATCHERR ZQDbase::GetRecord(ZQRecord& record, int32_t n, int64_t* position, bool
         uint64_t raw = 0;
         for (int32_t k = 0; k < take; ++k) raw |= uint64_t{bytes[k]} << (8 * k);
         if (take > 0 && take < 8 && (bytes[take - 1] & 0x80)) raw |= ~uint64_t{0} << (8 * take);
-        *field = double(int64_t(raw)) / 10000.0;
+        // The value as its exact decimal text, not a double: beyond 2^53
+        // ten-thousandths (about 9 * 10^11) a double drops the last digits.
+        // Trailing zeros of the fraction go, as a number's shortest form.
+        bool neg = int64_t(raw) < 0;
+        uint64_t mag = neg ? uint64_t(0) - raw : raw;
+        char text[32];
+        int n = snprintf(text, sizeof text, "%s%llu.%04u", neg ? "-" : "", static_cast<unsigned long long>(mag / 10000),
+                         unsigned(mag % 10000));
+        while (text[n - 1] == '0') --n;
+        if (text[n - 1] == '.') --n;
+        field->AssignText(text, n);
         break;
       }
       default:

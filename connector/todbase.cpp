@@ -588,8 +588,9 @@ bool TenThousandths(const ZQString& text, int64_t* out) {
       if (decimals++ == 4) round_up = *p >= '5';  // only the fifth decimal counts
       continue;
     }
-    if (v > (uint64_t{INT64_MAX} - 9) / 10) return false;
-    v = v * 10 + uint64_t(*p - '0');
+    uint64_t digit = uint64_t(*p - '0');
+    if (v > (uint64_t{INT64_MAX} - digit) / 10) return false;  // exact: INT64_MAX itself fits
+    v = v * 10 + digit;
     if (point) ++decimals;
   }
   if (digits == 0) return false;
@@ -597,8 +598,8 @@ bool TenThousandths(const ZQString& text, int64_t* out) {
     if (v > uint64_t{INT64_MAX} / 10) return false;
     v *= 10;
   }
+  if (round_up && v == uint64_t{INT64_MAX}) return false;
   if (round_up) ++v;
-  if (v > uint64_t{INT64_MAX}) return false;
   *out = neg ? -int64_t(v) : int64_t(v);
   return true;
 }

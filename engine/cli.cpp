@@ -15,6 +15,7 @@
 #include "engine/indexes.h"
 #include "engine/modules.h"
 #include "engine/outbuf.h"
+#include "engine/read_fix.h"
 #include "engine/report.h"
 #include "engine/writers.h"
 #include "host/zqglob.h"
@@ -31,7 +32,12 @@ const char kOptionsUsage[] =
     "  --dialect D              0-10 or a name: \"dBASE IV\", foxpro, clipper, ...\n"
     "  --type NAME              a connector definition by short name (zqdb formats): dbase, foxpro, clipper, ...\n"
     "  --modules DIR[:DIR]      where to look for connector modules first (also ZQDB_MODULE_PATH)\n"
-    "  --codepage N             the table's code page (437, 850, 1252, ...); 0 = bytes as they are\n"
+    "  --codepage N             the tables' code page (437, 850, cp850, windows-1252, utf-8, ...); 0 = bytes\n"
+    "                           as they are; default: the table's language driver byte, else its .cpg file\n"
+    "  --from-codepage N        convert: the source table's code page\n"
+    "  --to-codepage N          convert: the target table's code page (default: the table's own when adding\n"
+    "                           to one, else the source's)\n"
+    "  --strict                 convert: text that the target's code page can't hold is an error\n"
     "  --memo never|errors|always   when to ignore the memo file (default never)\n"
     "  --format csv|jsonl|table output of cat (default csv)\n"
     "  --to D                   convert: the target's dialect (default: the source's; dBASE IV for CSV)\n"
@@ -55,6 +61,8 @@ struct Args {
   OutputFormat format = OutputFormat::kCsv;
   ConvertOptions convert;
   KeysOptions keys;
+  // --codepage, --from-codepage, --to-codepage; kCodePageUnset when not given
+  int codepage = kCodePageUnset, from_codepage = kCodePageUnset, to_codepage = kCodePageUnset;
 };
 
 int Usage(const std::string& message) {
@@ -96,14 +104,14 @@ int ParseArgs(int argc, char** argv, Args* args) {
       std::string v;
       if (!take(&v) || v.empty()) return Usage("--modules needs a directory");
       SetModulePath(v);
-    } else if (a == "--codepage") {
+    } else if (a == "--codepage" || a == "--from-codepage" || a == "--to-codepage") {
       std::string v;
-      if (!take(&v)) return Usage("--codepage needs a value");
-      char* end = nullptr;
-      long cp = strtol(v.c_str(), &end, 10);
-      if (v.empty() || *end != '\0' || cp < 0 || cp > 99999 || !ZQGlob::CodePageSupported(int(cp)))
-        return Usage("unknown code page: " + v);
-      args->source.codepage = int(cp);
+      if (!take(&v)) return Usage(a + " needs a value");
+      int cp = 0;
+      if (!ParseCodePage(v, &cp)) return Usage("unknown code page: " + v + " (" + AcceptedCodePages() + ")");
+      (a == "--codepage" ? args->codepage : a == "--from-codepage" ? args->from_codepage : args->to_codepage) = cp;
+    } else if (a == "--strict") {
+      args->convert.write.table.strict = true;
     } else if (a == "--memo") {
       std::string v;
       if (!take(&v)) return Usage("--memo needs a value");
@@ -174,16 +182,30 @@ int ParseArgs(int argc, char** argv, Args* args) {
     PrintUsage(stderr);
     return kExitUsage;
   }
+  args->source.codepage = args->from_codepage != kCodePageUnset ? args->from_codepage : args->codepage;
   return 0;
 }
 
 // Opens the one table of `info` and `cat`.
-int OpenOrFail(const Args& args, SourcePtr* spoke) {
-  ReadOptions read;
-  read.table = args.source;
+int OpenOrFail(const Args& args, SourcePtr* spoke, CodePageChoice* chosen = nullptr) {
   std::string error;
-  if (!FindEndpoint("dbf")->open_source(args.files[0], read, spoke, &error)) return Fail(error);
+  if (OpenSource(args.files[0], args.source, spoke, &error, chosen) != 0) return Fail(error);
   return 0;
+}
+
+// The code page line of info: the code page and where it came from.
+std::string CodePageLine(const CodePageChoice& c) {
+  char driver[48] = "";
+  if (c.driver >= 0) snprintf(driver, sizeof driver, "language driver byte 0x%02X", unsigned(c.driver));
+  std::string page = c.codepage == kUtf8CodePage ? "UTF-8" : std::to_string(c.codepage);
+  if (c.codepage == 0) {
+    std::string why = c.origin.empty() ? (c.driver >= 0 ? std::string(driver) + ", no .cpg file" : "no .cpg file")
+                                       : c.origin;
+    return "none, bytes as they are (" + why + ")";
+  }
+  if (c.origin == "--codepage") return page + " (--codepage" + (c.driver >= 0 ? std::string("; ") + driver : "") + ")";
+  if (c.origin.rfind("the language driver", 0) == 0) return page + " (" + driver + ")";
+  return page + " (" + c.origin + (c.driver >= 0 ? std::string("; ") + driver : "") + ")";
 }
 
 const char* DialectName(int dialect) {
@@ -214,7 +236,8 @@ std::vector<std::pair<std::string, std::string>> Facts(const ZQSpoke* spoke) {
 int CmdInfo(const Args& args) {
   if (args.files.size() != 1) return Usage("info takes one table");
   SourcePtr spoke;
-  if (int rc = OpenOrFail(args, &spoke)) return rc;
+  CodePageChoice codepage;
+  if (int rc = OpenOrFail(args, &spoke, &codepage)) return rc;
   auto facts = Facts(spoke.get());
   auto fact = [&](const char* name) {
     for (const auto& f : facts)
@@ -237,6 +260,7 @@ int CmdInfo(const Args& args) {
   printf("records:     %s in the header, %lld live\n", fact("records").c_str(), static_cast<long long>(live));
   printf("layout:      header %s bytes, record %s bytes\n", fact("header").c_str(), fact("record").c_str());
   printf("memo:        %s\n", fact("memo").c_str());
+  printf("code page:   %s\n", CodePageLine(codepage).c_str());
   ZQRecord* layout = spoke->GetLayout(0);
   printf("fields:      %d\n", layout->FieldCount());
   printf("  %-4s %-11s %-4s %5s %4s\n", "#", "name", "type", "width", "dec");
@@ -300,10 +324,12 @@ int CmdCat(const Args& args) {
   OutBuf out(STDOUT_FILENO);
   std::unique_ptr<RecordWriter> writer = MakeWriter(args.format, out);
   ZQRecord& record = *spoke->GetLayout(0);
+  TableReadFix fix(spoke.get());
   writer->Begin(record);
   BATCHERR rc;
   int32_t n = 0;
   while ((rc = spoke->GetRecord(n)) == 0) {
+    fix.Apply(record);
     writer->Row(record);
     if (++n == INT32_MAX) break;
   }
@@ -338,7 +364,7 @@ int CmdConvert(const Args& args) {
   ConvertOptions opts = args.convert;
   opts.read.table = args.source;
   opts.write.table.type = args.source.type;
-  opts.write.table.codepage = args.source.codepage;
+  opts.write.table.codepage = args.to_codepage != kCodePageUnset ? args.to_codepage : args.codepage;
   opts.write.table.memo_policy = args.source.memo_policy;
   return RunConvert(args.files[0], args.files[1], opts);
 }

@@ -1,6 +1,9 @@
 #include "engine/convert.h"
 
+#include <unistd.h>
+
 #include <cstdio>
+#include <cstring>
 #include <memory>
 #include <string>
 
@@ -10,13 +13,21 @@
 
 int RunConvert(const std::string& src, const std::string& dst, const ConvertOptions& opts) {
   const Endpoint& to = TargetEndpoint(dst);
+  const Endpoint& from = SourceEndpoint(src);
   ReadOptions read = opts.read;
-  if (opts.write.mode != 0 && to.read_layout != nullptr)
-    read.into = [&](ZQRecord* layout) { return to.read_layout(dst, opts.write, layout); };
+  WriteOptions write = opts.write;
+  // A table's code page is chosen once, here: a new table written from it
+  // keeps it unless --to-codepage says otherwise.
+  bool table_source = strcmp(from.name, "dbf") == 0;
+  if (table_source) read.table.codepage = ChooseCodePage(src, read.table.codepage).codepage;
+  if (write.table.codepage == kCodePageUnset && (write.mode == 0 || access(dst.c_str(), F_OK) != 0))
+    write.table.codepage = table_source ? read.table.codepage : 0;
+  if (write.mode != 0 && to.read_layout != nullptr)
+    read.into = [&](ZQRecord* layout) { return to.read_layout(dst, write, layout); };
   SourcePtr source;
   std::string error;
-  if (!SourceEndpoint(src).open_source(src, read, &source, &error)) return Fail(error);
-  std::unique_ptr<Target> target = to.make_target(dst, opts.write, source.get(), &error);
+  if (!from.open_source(src, read, &source, &error)) return Fail(error);
+  std::unique_ptr<Target> target = to.make_target(dst, write, source.get(), &error);
   if (!target) return Fail(error);
   ZQExport* spoke = target->spoke();
   auto mode = ZQSpoke::SpokeMode(opts.write.mode);
@@ -25,6 +36,7 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
 
   FieldPlan plan;
   if (!plan.Make(*source->GetLayout(0), spoke, dst, target->AddsToExisting(), &error)) return Fail(error);
+  plan.SetTextCodePage(target->TextCodePage(), write.table.strict);
   std::vector<int> key;
   if (!plan.FindKey(opts.key, &key, &error)) return Fail(error);
   if (opts.write.mode == 2 && key.empty()) return Fail("update mode needs --key");

@@ -1,5 +1,7 @@
 #include "engine/convert_values.h"
 
+#include <climits>
+#include <cmath>
 #include <cstdio>
 #include <cstdlib>
 
@@ -25,6 +27,82 @@ static bool IsNumberText(const ZQString& s) {
   if (end == p) return false;
   while (*end == ' ') ++end;
   return *end == '\0';
+}
+
+static bool IsNumberLetter(char letter) {
+  return letter == 'N' || letter == 'F' || letter == 'I' || letter == 'Y';
+}
+
+// Digits before the point of a plain decimal text (sign, digits, point,
+// digits), leading zeros left out; -1 for text of another form.
+static int32_t PlainIntegerDigits(const char* p, int32_t n) {
+  int32_t i = p[0] == '-' || p[0] == '+';
+  while (i < n && p[i] == '0') ++i;
+  int32_t start = i;
+  while (i < n && p[i] >= '0' && p[i] <= '9') ++i;
+  int32_t digits = i - start;
+  if (i < n && p[i] == '.') ++i;
+  while (i < n && p[i] >= '0' && p[i] <= '9') ++i;
+  return i == n && n > (p[0] == '-' || p[0] == '+') ? digits : -1;
+}
+
+// True when the plain decimal text `p` is, in ten-thousandths rounded on the
+// fifth decimal (as a table stores a currency), within 64 bits.
+static bool TenThousandthsFit(const char* p, int32_t n) {
+  const char* end = p + n;
+  if (p < end && (*p == '-' || *p == '+')) ++p;
+  uint64_t v = 0;
+  int decimals = -1;  // -1: before the point
+  bool round_up = false;
+  for (; p < end; ++p) {
+    if (*p == '.') {
+      decimals = 0;
+      continue;
+    }
+    if (decimals >= 4) {
+      if (decimals++ == 4) round_up = *p >= '5';
+      continue;
+    }
+    uint64_t digit = uint64_t(*p - '0');
+    if (v > (uint64_t{INT64_MAX} - digit) / 10) return false;
+    v = v * 10 + digit;
+    if (decimals >= 0) ++decimals;
+  }
+  for (int d = decimals < 0 ? 0 : decimals; d < 4; ++d) {
+    if (v > uint64_t{INT64_MAX} / 10) return false;
+    v *= 10;
+  }
+  return v < uint64_t{INT64_MAX} || (v == uint64_t{INT64_MAX} && !round_up);
+}
+
+bool NumberFits(ZQField* dst, const FieldCheck& check) {
+  if (dst->held() == ZQField::Held::kBlank) return true;
+  if (dst->held() == ZQField::Held::kText) {
+    const ZQString& s = dst->StringRef();
+    int32_t digits = PlainIntegerDigits(s.c_str(), s.length());
+    if (digits < 0) {  // "1e3", " 12 ": stored by its value
+      double v = dst->DoubleVal();
+      if (!std::isfinite(v)) return false;
+      *dst = v;
+    } else if (check.letter == 'N' || check.letter == 'F') {
+      // Sign, digits, a carry of the rounding, point and decimals: if that
+      // fits, the text does.
+      if (digits + 2 + (check.decimals > 0 ? 1 + check.decimals : 0) <= check.width) return true;
+    } else if (check.letter == 'Y') {
+      return digits <= 14 || TenThousandthsFit(s.c_str(), s.length());
+    }
+  }
+  double v = dst->DoubleVal();
+  if (!std::isfinite(v)) return false;
+  switch (check.letter) {
+    case 'I': return v == std::trunc(v) && v >= INT32_MIN && v <= INT32_MAX;
+    case 'Y': return std::fabs(v) < 922337203685477.0;
+    default: {
+      static ZQString text;  // scratch: no allocation per value
+      dst->RenderText(text, 0);
+      return text.length() <= (check.width < 255 ? check.width : 255);
+    }
+  }
 }
 
 static bool IsLogicalText(const ZQString& s) {
@@ -55,13 +133,16 @@ bool CopyValue(ZQField* dst, ZQField* src, FieldCheck* check) {
       return true;
     case ZQField::Held::kText: {
       const ZQString& s = src->StringRef();
-      if ((check->letter == 'C' || check->letter == 'N' || check->letter == 'F') && s.length() > check->width)
-        ++check->cut;
+      if (check->letter == 'C' && s.length() > check->width) ++check->cut;
       dst->AssignText(s.c_str(), s.length());
-      return true;
+      return !IsNumberLetter(check->letter) || NumberFits(dst, *check);
     }
-    case ZQField::Held::kLong: dst->SetLong(src->LongVal()); return true;
-    case ZQField::Held::kDouble: *dst = src->DoubleVal(); return true;
+    case ZQField::Held::kLong:
+      dst->SetLong(src->LongVal());
+      return !IsNumberLetter(check->letter) || NumberFits(dst, *check);
+    case ZQField::Held::kDouble:
+      *dst = src->DoubleVal();
+      return !IsNumberLetter(check->letter) || NumberFits(dst, *check);
     case ZQField::Held::kDate: {
       const ZQDate& d = src->DateRef();
       dst->SetDate(d.Year(), d.Month(), d.Day());

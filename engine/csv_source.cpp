@@ -320,8 +320,10 @@ BATCHERR ZQFromCsv::AssignRow() {
         ok = ParseNumber(p, n, &id, &fd, &neg) && (letter != 'I' || fd == 0);
         what = letter == 'I' ? "an integer" : "a number";
         if (!ok) break;
+        // Currency keeps its digits as text: a double holds no more than
+        // about 9 * 10^11 exactly in ten-thousandths.
         if (letter == 'I') f->SetLong(strtoll(std::string(p, n).c_str(), nullptr, 10));
-        else if (letter == 'Y' || letter == 'B') *f = strtod(std::string(p, n).c_str(), nullptr);
+        else if (letter == 'B') *f = strtod(std::string(p, n).c_str(), nullptr);
         else f->AssignText(p, int32_t(n));
         break;
       }

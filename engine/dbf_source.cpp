@@ -142,7 +142,8 @@ void ApplyOptionText(ZQSpoke* spoke, const std::string& text) {
   spoke->SetOption(text.substr(0, eq).c_str(), text.substr(eq + 1).c_str());
 }
 
-BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePtr* out, std::string* error) {
+BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePtr* out, std::string* error,
+                    CodePageChoice* chosen) {
   TableConnector c;
   if (!ResolveConnector(opts.type, &c, error)) return ZQ_OPEN_ERROR;
   SourcePtr spoke = NewTableSource(c);
@@ -164,7 +165,9 @@ BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePt
     spoke->SetOption("version", guess);
   }
   char buf[16];
-  snprintf(buf, sizeof buf, "%d", opts.codepage);
+  CodePageChoice choice = ChooseCodePage(path, opts.codepage);
+  if (chosen != nullptr) *chosen = choice;
+  snprintf(buf, sizeof buf, "%d", ModuleCodePage(choice.codepage));
   spoke->SetOption("codepage", buf);
   snprintf(buf, sizeof buf, "%d", opts.memo_policy);
   spoke->SetOption("ignorememoerr", buf);

@@ -6,6 +6,7 @@
 
 #include <string>
 
+#include "engine/codepages.h"
 #include "engine/modules.h"
 #include "engine/spoke_ptr.h"
 #include "host/zqspoke.h"
@@ -13,7 +14,7 @@
 struct SourceOptions {
   std::string type;     // a definition's short name; "" for the default
   std::string dialect;  // number 0-10 or a name the version option accepts; "" = by the file
-  int codepage = 0;
+  int codepage = kCodePageUnset;  // --codepage; unset: by the language driver byte or a .cpg file
   int memo_policy = 0;  // 0 never, 1 errors, 2 always ignore the memo file
 };
 
@@ -43,5 +44,7 @@ int GuessDialect(const std::string& path);
 bool HasSibling(const std::string& path, const std::string& ext);
 
 // Opens `path`; on failure `error` holds the spoke's message and the result
-// is the spoke's code (non-zero).
-BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePtr* out, std::string* error);
+// is the spoke's code (non-zero). `chosen`, when given, tells how the code
+// page was chosen.
+BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePtr* out, std::string* error,
+                    CodePageChoice* chosen = nullptr);

@@ -33,6 +33,7 @@ class TableTarget : public Target {
 
   bool AddsToExisting() const override { return existing_; }
   bool KeepsBlankLogicals() const override { return false; }
+  int TextCodePage() const override { return opts_.table.codepage; }
 
   bool Open(std::string* error) override {
     if (existing_) before_ = CountRecords();
@@ -48,14 +49,23 @@ class TableTarget : public Target {
     ZQString v;
     spoke_->GetOption("version", v);
     if (!VerifyTable(work_, connector_, v.c_str(), opts_.table, before_ + added, error)) return false;
-    if (opts_.mode != 0) return finished_ = true;
+    if (opts_.mode != 0) {
+      // A table added to gets a .cpg file when it has none, like a new one.
+      if (opts_.table.codepage != 0 && !HasSibling(path_, "cpg") && !WriteCpg(path_, opts_.table.codepage, error))
+        return false;
+      return finished_ = true;
+    }
+    // The code page is named in a .cpg file beside the table, moved into
+    // place with it; an old one would name another code page.
+    if (opts_.table.codepage != 0 && !WriteCpg(work_, opts_.table.codepage, error)) return false;
     bool staged_mdx = HasSibling(work_, "mdx"), staged_cdx = HasSibling(work_, "cdx");
     if (!staging_.Commit(error)) return false;
     // An MDX or CDX file of the target's name that the new table didn't
     // bring indexed the table just replaced: left there, it would be taken
     // for this table's and get its keys added to the old ones.
-    if (!staged_mdx) RemoveOldIndex("mdx");
-    if (!staged_cdx) RemoveOldIndex("cdx");
+    if (!staged_mdx) RemoveOld("mdx", "the index file");
+    if (!staged_cdx) RemoveOld("cdx", "the index file");
+    if (opts_.table.codepage == 0) RemoveOld("cpg", "the code page file");
     return finished_ = true;
   }
 
@@ -77,7 +87,9 @@ class TableTarget : public Target {
     return count;
   }
 
-  void RemoveOldIndex(const char* ext) {
+  // Removes the file of the target's name with the extension `ext`, which
+  // belonged to the table just replaced (`what` it was, for the warning).
+  void RemoveOld(const char* ext, const char* what) {
     std::string base = path_;
     size_t dot = base.rfind('.');
     if (dot != std::string::npos && base.find('/', dot) == std::string::npos) base.resize(dot);
@@ -85,7 +97,7 @@ class TableTarget : public Target {
     for (char& c : upper) c = char(toupper(static_cast<unsigned char>(c)));
     for (const std::string& old : {base + "." + ext, base + "." + upper})
       if (access(old.c_str(), F_OK) == 0 && unlink(old.c_str()) == 0)
-        Warn("removed " + old + ", the index file of the table this one replaced");
+        Warn("removed " + old + ", " + what + " of the table this one replaced");
   }
 
   // Appends keep the table's MDX tags (dBASE) or CDX tags (FoxPro) current;
@@ -143,12 +155,18 @@ std::unique_ptr<Target> MakeTableTarget(const std::string& path, const WriteOpti
     dialect = source->GetOption("version", v) == 0 ? v.c_str() : "2";
   }
   if (!ApplyDialect(spoke.get(), dialect)) return *error = "unknown dialect: " + dialect, nullptr;
+  WriteOptions resolved = opts;
+  // The code page: the one asked for, else an existing table's own when
+  // records are added to it; else none (RunConvert passes the source's).
+  if (resolved.table.codepage == kCodePageUnset)
+    resolved.table.codepage =
+        opts.mode != 0 && access(path.c_str(), F_OK) == 0 ? ChooseCodePage(path, kCodePageUnset).codepage : 0;
   char buf[16];
-  snprintf(buf, sizeof buf, "%d", opts.table.codepage);
+  snprintf(buf, sizeof buf, "%d", ModuleCodePage(resolved.table.codepage));
   spoke->SetOption("codepage", buf);
   snprintf(buf, sizeof buf, "%d", opts.table.memo_policy);
   spoke->SetOption("ignorememoerr", buf);
-  return std::make_unique<TableTarget>(std::move(spoke), path, connector, opts);
+  return std::make_unique<TableTarget>(std::move(spoke), path, connector, resolved);
 }
 
 bool ReadTableLayout(const std::string& path, const WriteOptions& opts, ZQRecord* out) {

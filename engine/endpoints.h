@@ -39,7 +39,8 @@ struct IndexOption {
 struct TableWriteOptions {
   std::string type;     // the connector definition (--type); "" = the default
   std::string dialect;  // --to; "" = the table's own when adding to one, else the source's, else dBASE IV
-  int codepage = 0;     // --codepage
+  int codepage = kCodePageUnset;  // --to-codepage, --codepage; unset: the table's own, else the source's
+  bool strict = false;  // --strict: text the code page can't hold is an error, not a warning
   int memo_policy = 0;  // --memo: 0 never, 1 errors, 2 always ignore the memo file
   std::vector<IndexOption> indexes;  // --index, --unique-index
   bool plain_idx = false;            // --index-form plain: IDX files without compact keys
@@ -76,6 +77,8 @@ class Target {
   // False for a target that has no blank logical (a table stores F), so
   // that the run reports how many it wrote so.
   virtual bool KeepsBlankLogicals() const { return true; }
+  // The code page the target stores text in (0: as zqdb holds it, UTF-8).
+  virtual int TextCodePage() const { return 0; }
 
  protected:
   TargetPtr spoke_;

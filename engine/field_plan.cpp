@@ -2,9 +2,13 @@
 
 #include <algorithm>
 
+#include "engine/codepages.h"
 #include "engine/convert_layout.h"
 #include "engine/report.h"
 #include "engine/text_util.h"
+#include "host/bytescan.h"
+#include "host/codepage.h"
+#include "host/zqglob.h"
 
 bool FieldPlan::Make(ZQRecord& in, ZQExport* target, const std::string& path, bool existing, std::string* error) {
   in_ = &in;
@@ -48,7 +52,8 @@ void FieldPlan::Match(ZQExport* target) {
         match = i;
     if (match < 0) Warn(std::string("field ") + f->Name() + " of the table has no source field: left blank");
     else used[size_t(match)] = true;
-    routes_.push_back(FieldRoute{match, f->Name(), FieldCheck{char(f->DataType().Usage()), f->Length()}});
+    routes_.push_back(FieldRoute{match, f->Name(), FieldCheck{char(f->DataType().Usage()), f->Length(),
+                                                               int16_t(f->DecLen())}});
   }
   for (int i = 0; i < in.FieldCount(); ++i)
     if (!used[size_t(i)]) Warn(std::string("field ") + in[i]->Name() + " is left out: the table has no such field");
@@ -79,7 +84,7 @@ bool FieldPlan::Plan(ZQExport* target, std::string* error) {
     if (f == nullptr) return *error = "out of memory", false;
     target->FormatSpokeField(f, s);
     names.push_back(name);
-    routes_.push_back(FieldRoute{i, name, FieldCheck{char(plan.type.Usage()), f->Length()}});
+    routes_.push_back(FieldRoute{i, name, FieldCheck{char(plan.type.Usage()), f->Length(), int16_t(f->DecLen())}});
   }
   return true;
 }
@@ -98,20 +103,60 @@ bool FieldPlan::FindKey(const std::vector<std::string>& names, std::vector<int>*
   return true;
 }
 
-bool FieldPlan::Fill(int32_t n, std::string* error) {
+void FieldPlan::SetTextCodePage(int codepage, bool strict) {
+  codepage_ = ModuleCodePage(codepage);
+  strict_ = strict;
+}
+
+bool FieldPlan::Fill(int32_t n, std::string* error, bool again) {
   ZQRecord& in = *in_;
   ZQRecord& out = *out_;
   for (size_t i = 0; i < routes_.size(); ++i) {
     FieldRoute& r = routes_[i];
+    ZQField* f = out[int(i)];
     if (r.from < 0) {
-      out[int(i)]->Blank();
-    } else if (!CopyValue(out[int(i)], in[r.from], &r.check)) {
+      f->Blank();
+    } else if (!CopyValue(f, in[r.from], &r.check)) {
       const ZQString& v = in[r.from]->StringRef();
+      std::string type(1, r.check.letter);
+      if (r.check.letter == 'N' || r.check.letter == 'F')
+        type += "(" + std::to_string(r.check.width) +
+                (r.check.decimals > 0 ? "," + std::to_string(r.check.decimals) : std::string()) + ")";
       *error = "record " + std::to_string(n + 1) + ", field " + r.name + ": \"" +
-               std::string(v.c_str(), size_t(v.length() < 40 ? v.length() : 40)) + "\" doesn't fit a " +
-               std::string(1, r.check.letter) + " field";
+               std::string(v.c_str(), size_t(v.length() < 40 ? v.length() : 40)) + "\" doesn't fit a " + type +
+               " field";
+      return false;
+    } else if (codepage_ != 0 && (r.check.letter == 'C' || r.check.letter == 'M') &&
+               f->held() == ZQField::Held::kText && !CheckText(n, r, f, again, error)) {
       return false;
     }
+  }
+  return true;
+}
+
+// Text on its way into a code page: characters the code page lacks are
+// counted (or refused), and memo text is converted here, since the target
+// stores memos as they are given.
+bool FieldPlan::CheckText(int32_t n, const FieldRoute& r, ZQField* f, bool again, std::string* error) {
+  const ZQString& s = f->StringRef();
+  if (!bytescan::HasHighBit(s.c_str(), size_t(s.length()))) return true;
+  int32_t lost = Utf8Unmappable(codepage_, s.c_str(), s.length());
+  if (lost > 0) {
+    std::string where = "record " + std::to_string(n + 1) + ", field " + r.name;
+    if (strict_) {
+      *error = where + ": \"" + std::string(s.c_str(), size_t(s.length() < 40 ? s.length() : 40)) +
+               "\" has characters that code page " + std::to_string(codepage_) + " can't hold";
+      return false;
+    }
+    if (!again) {
+      if (unmappable_ == 0) first_unmappable_ = where;
+      unmappable_ += lost;
+    }
+  }
+  if (r.check.letter == 'M') {
+    scratch_ = s;
+    ZQGlob::InternalToExternal(codepage_, scratch_);
+    f->AssignText(scratch_.c_str(), scratch_.length());
   }
   return true;
 }
@@ -121,6 +166,9 @@ void FieldPlan::WarnLosses(bool keeps_blank_logicals) const {
     if (r.check.cut > 0)
       Warn(std::string("field ") + r.name + ": " + std::to_string(r.check.cut) + " values longer than " +
            std::to_string(r.check.width) + " bytes were cut");
+  if (unmappable_ > 0)
+    Warn(std::to_string(unmappable_) + " characters that code page " + std::to_string(codepage_) +
+         " can't hold were written as ? (the first in " + first_unmappable_ + "; --strict refuses them)");
   for (const FieldRoute& r : routes_)
     if (r.check.blank_logicals > 0 && !keeps_blank_logicals)
       Warn(std::string("field ") + r.name + ": " + std::to_string(r.check.blank_logicals) +

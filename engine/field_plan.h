@@ -31,13 +31,20 @@ class FieldPlan {
   // name), for update mode's key. False with `error` set.
   bool FindKey(const std::vector<std::string>& names, std::vector<int>* key, std::string* error) const;
 
+  // The code page the target stores text in (0: none): memo text is
+  // converted to it here (the target converts the other text itself), and
+  // characters it can't hold are counted, or refused with `strict`.
+  void SetTextCodePage(int codepage, bool strict);
+
   // Fills the target's record from the source's current one. False when a
   // value doesn't fit its target field, with `error` naming record `n`
-  // (0-based), the field and the value.
-  bool Fill(int32_t n, std::string* error);
+  // (0-based), the field and the value. `again`: the record was filled
+  // before, so what it loses is not counted twice.
+  bool Fill(int32_t n, std::string* error, bool again = false);
 
-  // Warns of the values changed on the way: text cut to its field, and
-  // blank logicals written as F when the target keeps no blank.
+  // Warns of the values changed on the way: text cut to its field, blank
+  // logicals written as F when the target keeps no blank, and characters
+  // that the target's code page can't hold.
   void WarnLosses(bool keeps_blank_logicals) const;
 
   ZQRecord& out() const { return *out_; }
@@ -46,7 +53,14 @@ class FieldPlan {
   void Match(ZQExport* target);
   bool Plan(ZQExport* target, std::string* error);
 
+  bool CheckText(int32_t n, const FieldRoute& r, ZQField* f, bool again, std::string* error);
+
   ZQRecord* in_ = nullptr;
   ZQRecord* out_ = nullptr;
   std::vector<FieldRoute> routes_;
+  int codepage_ = 0;  // of the target's text; 0: UTF-8, as held
+  bool strict_ = false;
+  int64_t unmappable_ = 0;                   // characters written as '?'
+  std::string first_unmappable_;             // "field F of record R"
+  ZQString scratch_;
 };

@@ -13,7 +13,7 @@ bool VerifyTable(const std::string& path, const TableConnector& c, const std::st
   SourcePtr check = NewTableSource(c);
   if (!check) return *message = "out of memory", false;
   ApplyDialect(check.get(), dialect);
-  check->SetOption("codepage", std::to_string(opts.codepage).c_str());
+  check->SetOption("codepage", std::to_string(ModuleCodePage(opts.codepage)).c_str());
   check->SetOption("ignorememoerr", std::to_string(opts.memo_policy).c_str());
   ZQConnTarget t;
   t.path = path.c_str();

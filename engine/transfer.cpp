@@ -6,6 +6,7 @@
 #include <cstdio>
 
 #include "engine/convert_values.h"
+#include "engine/read_fix.h"
 
 namespace {
 
@@ -60,12 +61,14 @@ int64_t KeyedRecords::Find(ZQRecord& record) {
 bool Transfer(ZQImport* source, ZQExport* target, FieldPlan& plan, KeyedRecords* keyed, bool progress,
               TransferCounts* counts, std::string* error) {
   Progress shown(progress);
+  TableReadFix fix(source);
   BATCHERR rc = 0;
   int32_t n = 0;
   std::string bad_value;
   for (;; ++n) {
     rc = source->GetRecord(n);
     if (rc != 0) break;
+    fix.Apply(*source->GetLayout(0));
     if (!plan.Fill(n, &bad_value)) {
       rc = ZQ_WRITE_ERROR;
       break;
@@ -75,7 +78,7 @@ bool Transfer(ZQImport* source, ZQExport* target, FieldPlan& plan, KeyedRecords*
       // Bring the old memo block numbers onto the fields, then the new values.
       target->SetFilePosition(at);
       if ((rc = target->GetandDeleteRecord(plan.out())) != 0) break;
-      plan.Fill(n, &bad_value);  // the values were checked above
+      plan.Fill(n, &bad_value, true);  // the values were checked above
       ++counts->updated;
     } else {
       if (keyed != nullptr) target->Unwind();

@@ -121,53 +121,68 @@ void CodePageToUtf8(int codepage, ZQString& text) {
   text.Swap(out);
 }
 
+namespace {
+
+// The byte of the code page for the UTF-8 character at p[*i] (of n bytes),
+// moving *i past it; -1 for a character the code page lacks, or a byte that
+// is no UTF-8.
+int MapUtf8Char(const CodePageMap* map, const uint8_t* p, int32_t n, int32_t* at) {
+  int32_t i = *at;
+  uint32_t c = p[i];
+  int extra = c >= 0xF0 && c < 0xF8 ? 3 : c >= 0xE0 && c < 0xF0 ? 2 : c >= 0xC2 && c < 0xE0 ? 1 : 0;
+  uint32_t cp = c;
+  bool ok = c < 0x80 || (extra > 0 && i + extra < n);
+  if (extra > 0 && ok) {
+    cp = c & (0x3F >> extra);
+    for (int j = 1; j <= extra; ++j) {
+      if ((p[i + j] & 0xC0) != 0x80) ok = false;
+      cp = cp << 6 | (p[i + j] & 0x3F);
+    }
+  }
+  if (!ok || (c >= 0x80 && extra == 0)) {
+    *at = i + 1;  // not UTF-8
+    return -1;
+  }
+  *at = i + extra + 1;
+  if (cp < 0x80 && map->to_unicode[cp] == cp) return int(cp);
+  int lo = 0, hi = 128;
+  while (lo < hi) {
+    int mid = (lo + hi) / 2;
+    if (map->sorted_cp[mid] < cp) lo = mid + 1;
+    else hi = mid;
+  }
+  if (lo < 128 && map->sorted_cp[lo] == cp) return map->sorted_byte[lo];
+  int b = 0;
+  while (b < 0x80 && map->to_unicode[b] != cp) ++b;  // low half of odd code pages
+  return b < 0x80 ? b : -1;
+}
+
+}  // namespace
+
 void Utf8ToCodePage(int codepage, ZQString& text) {
   int32_t n = text.length();
   const auto* p = reinterpret_cast<const uint8_t*>(text.c_str());
   if (!bytescan::HasHighBit(text.c_str(), size_t(n))) return;  // ASCII is the same in every code page here
-  int32_t i = 0;
   const CodePageMap* map = CodePageTable(codepage);
   if (map == nullptr) return;
   static ZQString out;
   if (!out.Allocate(n)) return;
   char* o = out.GetBuffer();
   int32_t k = 0;
-  for (i = 0; i < n;) {
-    uint32_t c = p[i];
-    int extra = c >= 0xF0 && c < 0xF8 ? 3 : c >= 0xE0 && c < 0xF0 ? 2 : c >= 0xC2 && c < 0xE0 ? 1 : 0;
-    uint32_t cp = c;
-    bool ok = c < 0x80 || (extra > 0 && i + extra < n);
-    if (extra > 0 && ok) {
-      cp = c & (0x3F >> extra);
-      for (int j = 1; j <= extra; ++j) {
-        if ((p[i + j] & 0xC0) != 0x80) ok = false;
-        cp = cp << 6 | (p[i + j] & 0x3F);
-      }
-    }
-    if (!ok || (c >= 0x80 && extra == 0)) {
-      o[k++] = '?';  // not UTF-8
-      ++i;
-      continue;
-    }
-    i += extra + 1;
-    if (cp < 0x80 && map->to_unicode[cp] == cp) {
-      o[k++] = char(cp);
-      continue;
-    }
-    int lo = 0, hi = 128;
-    while (lo < hi) {
-      int mid = (lo + hi) / 2;
-      if (map->sorted_cp[mid] < cp) lo = mid + 1;
-      else hi = mid;
-    }
-    if (lo < 128 && map->sorted_cp[lo] == cp) {
-      o[k++] = char(map->sorted_byte[lo]);
-      continue;
-    }
-    int b = 0;
-    while (b < 0x80 && map->to_unicode[b] != cp) ++b;  // low half of odd code pages
-    o[k++] = b < 0x80 ? char(b) : '?';
+  for (int32_t i = 0; i < n;) {
+    int b = MapUtf8Char(map, p, n, &i);
+    o[k++] = b < 0 ? '?' : char(b);
   }
   out.SetLength(k);
   text.Swap(out);
+}
+
+int32_t Utf8Unmappable(int codepage, const char* s, int32_t n) {
+  const CodePageMap* map = CodePageTable(codepage);
+  if (map == nullptr) return -1;
+  if (!bytescan::HasHighBit(s, size_t(n))) return 0;
+  const auto* p = reinterpret_cast<const uint8_t*>(s);
+  int32_t lost = 0;
+  for (int32_t i = 0; i < n;) lost += MapUtf8Char(map, p, n, &i) < 0;
+  return lost;
 }

@@ -24,3 +24,7 @@ struct CodePageMap {
 const CodePageMap* CodePageTable(int codepage);
 void CodePageToUtf8(int codepage, ZQString& text);
 void Utf8ToCodePage(int codepage, ZQString& text);
+// How many characters of the UTF-8 text `s` (`n` bytes) Utf8ToCodePage would
+// write as '?' (not in the code page, or not UTF-8); -1 for a code page
+// without a table. A '?' of the text itself is no loss and isn't counted.
+int32_t Utf8Unmappable(int codepage, const char* s, int32_t n);

@@ -18,7 +18,8 @@ def must(cmd):
 
 with workdir() as d:
     # shapelib: dbfadd stores the text bytes it is given (UTF-8 here) and
-    # keeps leading blanks. zqdb without a code page passes bytes through.
+    # keeps leading blanks, in a table it marks as code page 1252 (language
+    # driver 0x57) all the same: the text is read as UTF-8 by --codepage.
     shp = os.path.join(d, "shape.dbf")
     with s.case("shapelib write"):
         must(["dbfcreate", shp, "-s", "NAME", "24", "-n", "QTY", "6", "0", "-n", "PRICE", "12", "3",
@@ -26,7 +27,7 @@ with workdir() as d:
         for row in (["  lead", "12", "3.25", "A"], ["Müller, \"Zoë\"", "-4", "-0.5", "B"],
                     ["東京", "0", "0", ""], ["x" * 24, "999999", "99999999.999", "xyz"]):
             must(["dbfadd", shp] + row)
-    rows = s.compare_table("shapelib", shp, [], "utf-8", expect_live=4)
+    rows = s.compare_table("shapelib", shp, ["--codepage", "utf-8"], "utf-8", expect_live=4)
     if rows:
         s.check("shapelib leading blanks kept", rows[0]["NAME"] == "  lead", repr(rows[0]["NAME"]))
         s.check("shapelib UTF-8 text", rows[1]["NAME"] == "Müller, \"Zoë\"" and rows[2]["NAME"] == "東京",
@@ -56,5 +57,15 @@ with workdir() as d:
     with s.case("ogr2ogr plain"):
         must(["ogr2ogr", "-f", "ESRI Shapefile", "-lco", "ENCODING=CP1252", plain, csv])
     s.compare_table("GDAL text columns", plain, ["--codepage", "1252"], "cp1252", expect_live=4)
+
+    # The code page of GDAL's tables is in their .cpg file, their language
+    # driver byte 0: zqdb finds it without --codepage.
+    for enc, cpg in (("CP1252", "CP1252"), ("CP850", "CP850"), ("UTF-8", "UTF-8")):
+        path = os.path.join(d, "cpg_%s.dbf" % enc.replace("-", ""))
+        with s.case("ogr2ogr " + enc):
+            must(["ogr2ogr", "-f", "ESRI Shapefile", "-lco", "ENCODING=" + enc, path, csv])
+            with open(path[:-4] + ".cpg") as f:
+                s.check("GDAL .cpg " + enc, f.read().strip() == cpg, path)
+        s.compare_table("GDAL %s by its .cpg" % enc, path, [], enc.lower(), expect_live=4)
 
 s.done()

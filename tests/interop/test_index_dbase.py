@@ -236,7 +236,7 @@ def numeric_keys(d):
     in zqdb's order, and a seek by those bytes finds each key."""
     with s.case("numeric keys"):
         ndx = os.path.join(d, "n.ndx")
-        table = convert(d, "num", NUMBERS, "--schema", "ID N(3), K N(9,2)", "--index", "NK=K",
+        table = convert(d, "num", NUMBERS, "--schema", "ID N(3), K N(10,2)", "--index", "NK=K",
                         "--index", ndx + "=K")
         want = sorted((struct.pack("<d", v).hex(), r) for r, v in enumerate(NUMBERS, 1))
         s.check("numeric order is not value order", [struct.unpack("<d", bytes.fromhex(k))[0] for k, _ in want]

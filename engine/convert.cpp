@@ -40,6 +40,10 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
   std::vector<int> key;
   if (!plan.FindKey(opts.key, &key, &error)) return Fail(error);
   if (opts.write.mode == 2 && key.empty()) return Fail("update mode needs --key");
+  // Append and update change a table in place: every value is checked
+  // before the first byte is written, so that a bad one leaves the table,
+  // its memo file and its index files as they were.
+  if (target->AddsToExisting() && !CheckValues(source.get(), plan, &error)) return Fail(error);
 
   if (!target->Open(&error)) return Fail(error);
   std::unique_ptr<KeyedRecords> keyed;

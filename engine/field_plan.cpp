@@ -161,6 +161,12 @@ bool FieldPlan::CheckText(int32_t n, const FieldRoute& r, ZQField* f, bool again
   return true;
 }
 
+void FieldPlan::ResetCounts() {
+  for (FieldRoute& r : routes_) r.check.cut = r.check.blank_logicals = 0;
+  unmappable_ = 0;
+  first_unmappable_.clear();
+}
+
 void FieldPlan::WarnLosses(bool keeps_blank_logicals) const {
   for (const FieldRoute& r : routes_)
     if (r.check.cut > 0)

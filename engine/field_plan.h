@@ -47,6 +47,9 @@ class FieldPlan {
   // that the target's code page can't hold.
   void WarnLosses(bool keeps_blank_logicals) const;
 
+  // Forgets what the values lost so far (after a pass that only checked them).
+  void ResetCounts();
+
   ZQRecord& out() const { return *out_; }
 
  private:

@@ -58,6 +58,24 @@ int64_t KeyedRecords::Find(ZQRecord& record) {
   return -1;
 }
 
+bool CheckValues(ZQImport* source, FieldPlan& plan, std::string* error) {
+  TableReadFix fix(source);
+  for (int32_t n = 0;; ++n) {
+    BATCHERR rc = source->GetRecord(n);
+    if (rc == ZQ_END) break;
+    if (rc != 0) {
+      *error = source->LastErrorMessage();
+      if (error->empty()) *error = "cannot read record " + std::to_string(n + 1) + " of the source";
+      return false;
+    }
+    fix.Apply(*source->GetLayout(0));
+    if (!plan.Fill(n, error)) return false;
+    if (n == INT32_MAX) break;
+  }
+  plan.ResetCounts();
+  return true;
+}
+
 bool Transfer(ZQImport* source, ZQExport* target, FieldPlan& plan, KeyedRecords* keyed, bool progress,
               TransferCounts* counts, std::string* error) {
   Progress shown(progress);

@@ -33,6 +33,12 @@ struct TransferCounts {
   int64_t added = 0, updated = 0;
 };
 
+// Reads every record of `source` through `plan` without writing one: true
+// when each value fits its target field, else false with `error` naming the
+// first that doesn't (or the source's own error). A run that changes a table
+// in place calls it first, so that a bad value leaves the table as it was.
+bool CheckValues(ZQImport* source, FieldPlan& plan, std::string* error);
+
 // Moves each record of `source` into `target`: added, or with `keyed`
 // (update mode) put in place of the target's record of the same key when
 // there is one. True when every record went; else false with `error` set.

@@ -17,6 +17,7 @@
 #include "engine/outbuf.h"
 #include "engine/read_fix.h"
 #include "engine/report.h"
+#include "engine/target_path.h"
 #include "engine/writers.h"
 #include "host/zqglob.h"
 #include "host/zqutil.h"
@@ -361,7 +362,14 @@ int CmdConvert(const Args& args) {
   if (!args.keys.index.empty()) return Usage("--index takes NAME=EXPR, not " + args.keys.index);
   if (args.keys.has_seek || args.keys.reverse) return Usage("--seek and --reverse go with keys");
   if (args.convert.write.mode != 2 && !args.convert.key.empty()) return Usage("--key goes with --mode update");
+  if (IsForeignTargetName(args.files[1]))
+    return Usage("zqdb writes tables, CSV and JSON-lines files, not " + args.files[1] +
+                 " (name it .dbf, .csv or .jsonl, or - for standard output)");
+  if (args.files[1] == "-" && args.format == OutputFormat::kTable) return Usage("convert writes csv or jsonl to -");
+  if (args.files[1] == "-" && !args.convert.write.table.dialect.empty())
+    return Usage("a table can't be written to standard output (--to goes with a table target)");
   ConvertOptions opts = args.convert;
+  opts.stdout_jsonl = args.format == OutputFormat::kJsonl;
   opts.read.table = args.source;
   opts.write.table.type = args.source.type;
   opts.write.table.codepage = args.to_codepage != kCodePageUnset ? args.to_codepage : args.codepage;

@@ -9,10 +9,13 @@
 
 #include "engine/field_plan.h"
 #include "engine/report.h"
+#include "engine/target_path.h"
 #include "engine/transfer.h"
 
-int RunConvert(const std::string& src, const std::string& dst, const ConvertOptions& opts) {
-  const Endpoint& to = TargetEndpoint(dst);
+int RunConvert(const std::string& src, const std::string& named, const ConvertOptions& opts) {
+  const Endpoint& to = named != "-" ? TargetEndpoint(named) : *FindEndpoint(opts.stdout_jsonl ? "jsonl" : "csv");
+  std::string dst, error;
+  if (!ResolveTargetPath(named, strcmp(to.name, "dbf") == 0, &dst, &error)) return Fail(error);
   const Endpoint& from = SourceEndpoint(src);
   ReadOptions read = opts.read;
   WriteOptions write = opts.write;
@@ -25,7 +28,6 @@ int RunConvert(const std::string& src, const std::string& dst, const ConvertOpti
   if (write.mode != 0 && to.read_layout != nullptr)
     read.into = [&](ZQRecord* layout) { return to.read_layout(dst, write, layout); };
   SourcePtr source;
-  std::string error;
   if (!from.open_source(src, read, &source, &error)) return Fail(error);
   std::unique_ptr<Target> target = to.make_target(dst, write, source.get(), &error);
   if (!target) return Fail(error);

@@ -15,6 +15,7 @@ struct ConvertOptions {
   WriteOptions write;            // the target's: the mode, and a table's dialect (--to), ...
   std::vector<std::string> key;  // update mode: the fields that find a record
   bool progress = true;          // on a terminal, for runs over a second
+  bool stdout_jsonl = false;     // the target "-": JSON lines, not CSV
 };
 
 // Runs the conversion; the exit status (0, or 1 with the message printed).

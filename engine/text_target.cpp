@@ -1,6 +1,7 @@
 #include "engine/text_target.h"
 
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -20,8 +21,16 @@ BATCHERR ZQToText::_OpenOutput(const ZQConnTarget& target) {
   inserted_count_ = 0;
   if (target.path.length() == 0) return ZQ_NO_FILENAME;
   final_path_ = target.path.c_str();
-  temp_path_ = final_path_ + ".zqdb-part";
-  fd_ = open(temp_path_.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
+  struct stat st;
+  temp_path_.clear();
+  if (final_path_ == "-") {
+    fd_ = dup(STDOUT_FILENO);
+  } else if (stat(final_path_.c_str(), &st) == 0 && !S_ISREG(st.st_mode)) {
+    fd_ = open(final_path_.c_str(), O_WRONLY | O_CLOEXEC);  // a device or FIFO: no file to rename
+  } else {
+    temp_path_ = final_path_ + ".zqdb-part";
+    fd_ = open(temp_path_.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC, 0644);
+  }
   if (fd_ < 0) return LogError(4, ZQ_CREATE_ERROR, "cannot create %s: %s", final_path_.c_str(), strerror(errno));
   out_ = std::make_unique<OutBuf>(fd_);
   writer_ = MakeWriter(format_, *out_);
@@ -47,6 +56,7 @@ BATCHERR ZQToText::_CloseOutput(bool keep) {
   out_.reset();
   if (close(fd_) != 0) ok = false;
   fd_ = -1;
+  if (temp_path_.empty()) return keep && !ok ? LogError(4, ZQ_WRITE_ERROR, "cannot write %s", final_path_.c_str()) : 0;
   if (keep && ok && rename(temp_path_.c_str(), final_path_.c_str()) == 0) return 0;
   unlink(temp_path_.c_str());
   if (keep) return LogError(4, ZQ_WRITE_ERROR, "cannot write %s", final_path_.c_str());

@@ -1,6 +1,7 @@
-// CSV and JSON-lines files as target spokes. The file is written beside its
+// CSV and JSON-lines files as target spokes. A file is written beside its
 // final name and renamed into place when the run is kept, so a failed run
-// never leaves a half-written file under that name.
+// never leaves a half-written file under that name. "-" is standard output,
+// and a device or FIFO is written into as the records come.
 #pragma once
 
 #include <memory>
@@ -24,7 +25,7 @@ class ZQToText : public ZQExport {
 
  private:
   OutputFormat format_;
-  std::string final_path_, temp_path_;
+  std::string final_path_, temp_path_;  // temp_path_ "": written in place
   int fd_ = -1;
   std::unique_ptr<OutBuf> out_;
   std::unique_ptr<RecordWriter> writer_;

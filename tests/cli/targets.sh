@@ -1,0 +1,60 @@
+# Where convert writes: "-" is standard output, a symbolic link is written
+# through and stays a link, a device, FIFO or directory takes no table, and a
+# name of a format zqdb doesn't write is a usage error.
+source "$(dirname "$0")/lib.bash" "$1"
+case $ZQDB in /*) ;; *) ZQDB=$PWD/$ZQDB ;; esac
+cd "$WORK" || exit 1
+
+same() {  # same WHAT GOT WANT
+  if [ "$2" = "$3" ]; then PASSED=$((PASSED + 1)); else fail "$1: got '$2', expected '$3'"; fi
+}
+
+make_table t.dbf
+expect_run 0 convert t.dbf -
+same "CSV on standard output" "$(tr -d '\r' <"$OUT")" "NAME,QTY
+alice,42"
+[ -e ./- ] && fail "a file named - was made" || PASSED=$((PASSED + 1))
+expect_run 0 convert t.dbf - --format jsonl && same "JSON lines on standard output" "$(cat "$OUT")" '{"NAME":"alice","QTY":42}'
+expect_run 2 convert t.dbf - --to 4 && expect_err "zqdb: a table can't be written to standard output"
+expect_run 2 convert t.dbf - --format table
+
+# A link to a table: the table it points to is replaced, the link stays.
+mkdir real
+make_table real/old.dbf
+ln -s real/old.dbf link.dbf
+printf 'NAME\nnew\n' >new.csv
+expect_run 0 convert new.csv link.dbf
+same "the link stays" "$(readlink link.dbf)" "real/old.dbf"
+expect_run 0 cat real/old.dbf && expect_out "new"
+ln -s real/out.csv link.csv
+: >real/out.csv
+expect_run 0 convert t.dbf link.csv
+same "a CSV link stays" "$(readlink link.csv)$(tr -d '\r' <real/out.csv | tail -1)" "real/out.csvalice,42"
+# A link to nothing is refused, and nothing is made.
+ln -s real/none.dbf dangling.dbf
+expect_run 1 convert t.dbf dangling.dbf && expect_err "zqdb: dangling.dbf is a symbolic link to a file that doesn't exist"
+[ -e real/none.dbf ] && fail "a table was made through a link to nothing" || PASSED=$((PASSED + 1))
+
+# A FIFO takes CSV as it is written, but no table; a directory nothing.
+mkfifo pipe.csv pipe.dbf
+cat pipe.csv >from_pipe &
+expect_run 0 convert t.dbf pipe.csv
+wait
+same "CSV through a FIFO" "$(tr -d '\r' <from_pipe)" "NAME,QTY
+alice,42"
+expect_run 1 convert t.dbf pipe.dbf && expect_err "zqdb: pipe.dbf is a device, FIFO or socket: a table is written to a regular file"
+[ -p pipe.dbf ] && PASSED=$((PASSED + 1)) || fail "pipe.dbf is no FIFO any more"
+mkdir dir.dbf
+expect_run 1 convert t.dbf dir.dbf && expect_err "zqdb: dir.dbf is a directory"
+# /dev/stdout on a pipe is a device link: refused for a table, and it stays
+# the link it was (run as root, the link was once replaced by a table).
+"$ZQDB" convert t.dbf /dev/stdout 2>"$ERR" | cat >/dev/null
+same "a table to /dev/stdout on a pipe" "$(head -c 57 "$ERR")" "zqdb: /dev/stdout is a device, FIFO or socket: a table is"
+[ -L /dev/stdout ] && PASSED=$((PASSED + 1)) || fail "/dev/stdout is no link any more"
+
+# Names of formats zqdb doesn't write.
+for name in out.tsv out.txt OUT.TXT; do
+  expect_run 2 convert t.dbf "$name" && expect_err "zqdb: zqdb writes tables, CSV and JSON-lines files, not $name"
+  [ -e "$name" ] && fail "$name was made" || PASSED=$((PASSED + 1))
+done
+finish

@@ -40,7 +40,7 @@ const char kOptionsUsage[] =
     "                           to one, else the source's)\n"
     "  --strict                 convert: text that the target's code page can't hold is an error\n"
     "  --memo never|errors|always   when to ignore the memo file (default never)\n"
-    "  --format csv|jsonl|table output of cat (default csv)\n"
+    "  --format csv|jsonl|table output of cat, and of convert to - (default csv)\n"
     "  --to D                   convert: the target's dialect (default: the source's; dBASE IV for CSV)\n"
     "  --mode replace|append|update   convert: make the target anew, add to it, or update it by --key\n"
     "  --key FIELD[,FIELD]      convert --mode update: the fields that identify a record\n"

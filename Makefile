@@ -10,7 +10,8 @@ JOBS       ?= $(shell nproc 2>/dev/null || echo 2)
 
 # What each package is for: see README.md, "Dependencies".
 PACKAGES = cmake ninja-build g++ clang libclang-rt-14-dev libgtest-dev python3 \
-           python3-dbfread python3-dbf libdbd-xbase-perl libxbase64-dev shapelib gdal-bin pgdbf dpkg-dev
+           python3-dbfread python3-dbf libdbd-xbase-perl libxbase64-dev shapelib gdal-bin pgdbf dpkg-dev \
+           libsqlite3-dev sqlite3 postgresql
 
 .PHONY: all setup build build-release demo test test-sanitize bench package clean
 

@@ -13,3 +13,4 @@ fi
 /usr/bin/python3 "$(dirname "$0")/bench_convert.py" "$1"
 /usr/bin/python3 "$(dirname "$0")/bench_memo.py" "$1"
 /usr/bin/python3 "$(dirname "$0")/bench_index.py" "$1"
+/usr/bin/python3 "$(dirname "$0")/bench_databases.py" "$1"

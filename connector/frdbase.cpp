@@ -124,6 +124,11 @@ void ZQFromDbase::ReportFacts(ZQString& text) const {
     for (char& c : upper) c = char(toupper(static_cast<unsigned char>(c)));
     if (!memopath(path.c_str(), ext, name, sizeof name) || access(name, F_OK) != 0)
       memopath(path.c_str(), upper.c_str(), name, sizeof name);
+    // The same facts one by one, for hosts that report them as data.
+    Line(text, "memo file", name);
+    Line(text, "memo kind", kind);
+    snprintf(buf, sizeof buf, "%u", t->memofailed ? 0u : unsigned(t->memoblksize));
+    Line(text, "memo block", buf);
     if (t->memofailed)
       snprintf(buf, sizeof buf, "%s (%s) could not be opened or was refused", name, kind);
     else

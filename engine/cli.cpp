@@ -3,6 +3,7 @@
 #include <fcntl.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cctype>
 #include <cstdio>
 #include <cstdlib>
@@ -19,6 +20,9 @@
 #include "engine/report.h"
 #include "engine/target_path.h"
 #include "engine/writers.h"
+#include "engine/field_plan.h"
+#include "engine/text_util.h"
+#include "host/endian.h"
 #include "host/zqglob.h"
 #include "host/zqutil.h"
 
@@ -26,44 +30,56 @@ namespace {
 
 constexpr int kExitUsage = 2;
 
-// The usage after the list of commands.
-const char kOptionsUsage[] =
-    "\n"
-    "options (before or after the file names):\n"
-    "  --dialect D              0-10 or a name: \"dBASE IV\", foxpro, clipper, ...\n"
-    "  --type NAME              a connector definition by short name (zqdb formats): dbase, foxpro, clipper, ...\n"
-    "  --modules DIR[:DIR]      where to look for connector modules first (also ZQDB_MODULE_PATH)\n"
-    "  --codepage N             the tables' code page (437, 850, cp850, windows-1252, utf-8, ...); 0 = bytes\n"
-    "                           as they are; default: the table's language driver byte, else its .cpg file\n"
-    "  --from-codepage N        convert: the source table's code page\n"
-    "  --to-codepage N          convert: the target table's code page (default: the table's own when adding\n"
-    "                           to one, else the source's)\n"
-    "  --strict                 convert: text that the target's code page can't hold is an error\n"
-    "  --memo never|errors|always   when to ignore the memo file (default never)\n"
-    "  --format csv|jsonl|table output of cat, and of convert to - (default csv)\n"
-    "  --to D                   convert: the target's dialect (default: the source's; dBASE IV for CSV)\n"
-    "  --mode replace|append|update   convert: make the target anew, add to it, or update it by --key\n"
-    "  --key FIELD[,FIELD]      convert --mode update: the fields that identify a record\n"
-    "  --schema \"NAME C(30), BORN D, AMOUNT N(12,2), NOTE M\"   convert: column types of a CSV source\n"
-    "  --index NAME=EXPR        convert: make the new table with this index (repeatable); NAME is a tag\n"
-    "                           of the table's MDX or CDX file, or a path ending in .ndx or .idx\n"
-    "  --unique-index NAME=EXPR convert: the same, for an index without duplicates\n"
-    "  --index-form plain       convert: IDX files without compact keys (default compact)\n"
-    "  --index NAME             keys: the index to walk (a tag or an .ndx/.idx path)\n"
-    "  --seek KEY               keys: start at the first key not less than KEY\n"
-    "  --reverse                keys: walk backwards (NDX, IDX, CDX)\n"
-    "  --no-progress            convert: no progress line on a terminal\n"
-    "  --help                   this text\n";
+// Every option, with its line of help. A command's help shows the lines of
+// the options it takes (Command::options).
+struct OptionHelp {
+  const char* name;  // without the leading "--"
+  const char* text;
+};
+const OptionHelp kOptionHelp[] = {
+    {"dialect", "  --dialect D              0-10 or a name: \"dBASE IV\", foxpro, clipper, ...\n"},
+    {"type", "  --type NAME              a connector definition by short name (zqdb formats): dbase, foxpro, ...\n"},
+    {"modules", "  --modules DIR[:DIR]      where to look for connector modules first (also ZQDB_MODULE_PATH)\n"},
+    {"codepage", "  --codepage N             the tables' code page (437, 850, cp850, windows-1252, utf-8, ...); 0 = bytes\n"
+                 "                           as they are; default: the table's language driver byte, else its .cpg file\n"},
+    {"from-codepage", "  --from-codepage N        the source table's code page\n"},
+    {"to-codepage", "  --to-codepage N          the target table's code page (default: the table's own when adding\n"
+                    "                           to one, else the source's)\n"},
+    {"memo", "  --memo never|errors|always   when to ignore the memo file (default never)\n"},
+    {"format", "  --format F               info: text|json; cat: csv|jsonl|table|pgsql; convert: the target's format\n"
+               "                           (dbf, csv, jsonl, sqlite, pgsql; csv or jsonl to -); keys: csv|jsonl\n"},
+    {"fields", "  --fields A,B,C           only these fields, in this order\n"},
+    {"table", "  --table NAME             the table of a SQLite database or PostgreSQL script (default: the file's base name)\n"},
+    {"to", "  --to D                   the target's dialect (default: the source's; dBASE IV for other sources)\n"},
+    {"mode", "  --mode replace|append|update   make the target anew, add to it, or update it by --key\n"},
+    {"key", "  --key FIELD[,FIELD]      --mode update: the fields that identify a record\n"},
+    {"schema", "  --schema \"NAME C(30), BORN D, AMOUNT N(12,2), NOTE M\"   column types of a CSV source\n"},
+    {"index", "  --index NAME=EXPR        convert: make the new table with this index (repeatable); NAME is a tag\n"
+              "                           of the table's MDX or CDX file, or a path ending in .ndx or .idx\n"
+              "  --index NAME             keys: the index to walk (a tag or an .ndx/.idx path)\n"},
+    {"unique-index", "  --unique-index NAME=EXPR the same, for an index without duplicates\n"},
+    {"index-form", "  --index-form plain       IDX files without compact keys (default compact)\n"},
+    {"seek", "  --seek KEY               start at the first key not less than KEY\n"},
+    {"reverse", "  --reverse                walk backwards (NDX, IDX, CDX)\n"},
+    {"no-progress", "  --no-progress            no progress line on a terminal\n"},
+    {"quiet", "  --quiet                  no warnings\n"},
+    {"strict", "  --strict                 every warning is an error, and text the target's code page can't hold\n"},
+};
 
 struct Args {
   std::string command;
   std::vector<std::string> files;
+  std::vector<std::string> seen;  // the options given, without "--"
+  bool help = false;              // --help: the command's usage
+  bool version = false;
   SourceOptions source;
-  OutputFormat format = OutputFormat::kCsv;
+  std::string format;             // --format as given; each command takes its own
   ConvertOptions convert;
   KeysOptions keys;
   // --codepage, --from-codepage, --to-codepage; kCodePageUnset when not given
   int codepage = kCodePageUnset, from_codepage = kCodePageUnset, to_codepage = kCodePageUnset;
+  std::vector<std::string> fields;  // --fields
+  std::string read_table;           // --table
 };
 
 int Usage(const std::string& message) {
@@ -72,6 +88,19 @@ int Usage(const std::string& message) {
 }
 
 void PrintUsage(FILE* out);
+
+// Splits "A,B,C" into names; false when one is empty.
+bool SplitNames(const std::string& v, std::vector<std::string>* out) {
+  size_t start = 0;
+  for (;;) {
+    size_t comma = v.find(',', start);
+    std::string part = v.substr(start, comma == std::string::npos ? std::string::npos : comma - start);
+    if (part.empty()) return false;
+    out->push_back(part);
+    if (comma == std::string::npos) return true;
+    start = comma + 1;
+  }
+}
 
 // Parses the command line; 0, or the exit status of a usage error.
 int ParseArgs(int argc, char** argv, Args* args) {
@@ -94,9 +123,11 @@ int ParseArgs(int argc, char** argv, Args* args) {
       *v = argv[++i];
       return true;
     };
+    if (a.rfind("--", 0) == 0 && a.size() > 2) args->seen.push_back(a.substr(2));
     if (a == "--help" || a == "-h") {
-      PrintUsage(stdout);
-      exit(0);
+      args->help = true;
+    } else if (a == "--version") {
+      args->version = true;
     } else if (a == "--dialect") {
       if (!take(&args->source.dialect) || args->source.dialect.empty()) return Usage("--dialect needs a value");
     } else if (a == "--type") {
@@ -113,6 +144,7 @@ int ParseArgs(int argc, char** argv, Args* args) {
       (a == "--codepage" ? args->codepage : a == "--from-codepage" ? args->from_codepage : args->to_codepage) = cp;
     } else if (a == "--strict") {
       args->convert.write.table.strict = true;
+      SetWarnings(WarnMode::kStrict);
     } else if (a == "--memo") {
       std::string v;
       if (!take(&v)) return Usage("--memo needs a value");
@@ -122,8 +154,7 @@ int ParseArgs(int argc, char** argv, Args* args) {
       else return Usage("--memo takes never, errors or always, not " + v);
     } else if (a == "--format") {
       std::string v;
-      if (!take(&v)) return Usage("--format needs a value");
-      if (!ParseFormat(v, &args->format)) return Usage("--format takes csv, jsonl or table, not " + v);
+      if (!take(&args->format) || args->format.empty()) return Usage("--format needs a value");
     } else if (a == "--to") {
       if (!take(&args->convert.write.table.dialect) || args->convert.write.table.dialect.empty()) return Usage("--to needs a value");
     } else if (a == "--mode") {
@@ -136,15 +167,7 @@ int ParseArgs(int argc, char** argv, Args* args) {
     } else if (a == "--key") {
       std::string v;
       if (!take(&v)) return Usage("--key needs a value");
-      size_t start = 0;
-      while (start <= v.size()) {
-        size_t comma = v.find(',', start);
-        std::string part = v.substr(start, comma == std::string::npos ? std::string::npos : comma - start);
-        if (part.empty()) return Usage("--key has an empty field name");
-        args->convert.key.push_back(part);
-        if (comma == std::string::npos) break;
-        start = comma + 1;
-      }
+      if (!SplitNames(v, &args->convert.key)) return Usage("--key has an empty field name");
     } else if (a == "--schema") {
       if (!take(&args->convert.read.schema)) return Usage("--schema needs a value");
     } else if (a == "--index" || a == "--unique-index") {
@@ -171,6 +194,14 @@ int ParseArgs(int argc, char** argv, Args* args) {
       args->keys.reverse = true;
     } else if (a == "--no-progress") {
       args->convert.progress = false;
+    } else if (a == "--quiet") {
+      SetWarnings(WarnMode::kQuiet);
+    } else if (a == "--fields") {
+      std::string v;
+      if (!take(&v) || v.empty()) return Usage("--fields needs field names");
+      if (!SplitNames(v, &args->fields)) return Usage("--fields has an empty field name");
+    } else if (a == "--table") {
+      if (!take(&args->read_table) || args->read_table.empty()) return Usage("--table needs a name");
     } else if (a.rfind("--", 0) == 0 && a.size() > 2) {
       return Usage("unknown option " + a);
     } else if (args->command.empty()) {
@@ -179,7 +210,7 @@ int ParseArgs(int argc, char** argv, Args* args) {
       args->files.push_back(a);
     }
   }
-  if (args->command.empty()) {
+  if (args->command.empty() && !args->help && !args->version) {
     PrintUsage(stderr);
     return kExitUsage;
   }
@@ -187,7 +218,7 @@ int ParseArgs(int argc, char** argv, Args* args) {
   return 0;
 }
 
-// Opens the one table of `info` and `cat`.
+// Opens the one table of `info` and `keys`.
 int OpenOrFail(const Args& args, SourcePtr* spoke, CodePageChoice* chosen = nullptr) {
   std::string error;
   if (OpenSource(args.files[0], args.source, spoke, &error, chosen) != 0) return Fail(error);
@@ -234,72 +265,178 @@ std::vector<std::pair<std::string, std::string>> Facts(const ZQSpoke* spoke) {
   return facts;
 }
 
+std::vector<std::string> SplitTabs(const std::string& s) {
+  std::vector<std::string> parts;
+  size_t start = 0;
+  for (size_t tab; (tab = s.find('\t', start)) != std::string::npos; start = tab + 1)
+    parts.push_back(s.substr(start, tab - start));
+  parts.push_back(s.substr(start));
+  return parts;
+}
+
+// A JSON string literal of `s`.
+std::string Json(const std::string& s) {
+  std::string out = "\"";
+  for (unsigned char c : s) {
+    if (c == '"' || c == '\\') out += '\\';
+    if (c < 0x20) {
+      char esc[8];
+      snprintf(esc, sizeof esc, "\\u%04x", c);
+      out += esc;
+    } else {
+      out += char(c);
+    }
+  }
+  return out + "\"";
+}
+
+// What info tells of a table: the facts of the module's report, the live
+// count, and the header bytes the engine reads itself.
+struct TableFacts {
+  std::string path;
+  TableHeader header;
+  bool have_header = false;
+  int dialect = -1;
+  std::string version, records, header_len, record_len;
+  int64_t live = -1;
+  std::string memo, memo_file, memo_kind, memo_block;
+  std::vector<std::vector<std::string>> fields;   // name, type, width, decimals
+  std::vector<std::vector<std::string>> indexes;  // name, expression, type, unique, file
+  CodePageChoice codepage;    // the code page the text is read in, and why
+  std::string codepage_line;
+};
+
+// The facts of the header alone, for a table the module refused: dBASE
+// II's header is laid out otherwise, so it gives its version byte only.
+void HeaderFacts(TableFacts* t) {
+  const uint8_t* h = t->header.bytes;
+  char buf[16];
+  snprintf(buf, sizeof buf, "0x%02X", unsigned(h[0]));
+  t->version = buf;
+  if (h[0] == 0x02 || t->header.size < 12) return;
+  t->records = std::to_string(GetLe32(h + 4));
+  t->header_len = std::to_string(GetLe16(h + 8));
+  t->record_len = std::to_string(GetLe16(h + 10));
+}
+
+void PrintInfoText(const TableFacts& t) {
+  printf("table:       %s\n", t.path.c_str());
+  if (t.dialect >= 0) printf("dialect:     %d (%s)\n", t.dialect, DialectName(t.dialect));
+  printf("version:     %s\n", t.version.c_str());
+  if (!t.records.empty()) {
+    if (t.live >= 0) printf("records:     %s in the header, %lld live\n", t.records.c_str(), static_cast<long long>(t.live));
+    else printf("records:     %s in the header\n", t.records.c_str());
+    printf("layout:      header %s bytes, record %s bytes\n", t.header_len.c_str(), t.record_len.c_str());
+  }
+  if (t.dialect < 0) return;
+  printf("memo:        %s\n", t.memo.c_str());
+  printf("code page:   %s\n", t.codepage_line.c_str());
+  printf("fields:      %zu\n", t.fields.size());
+  printf("  %-4s %-11s %-4s %5s %4s\n", "#", "name", "type", "width", "dec");
+  for (size_t i = 0; i < t.fields.size(); ++i)
+    printf("  %-4zu %-11s %-4s %5s %4s\n", i + 1, t.fields[i][0].c_str(), t.fields[i][1].c_str(),
+           t.fields[i][2].c_str(), t.fields[i][3].c_str());
+  printf("indexes:     %zu\n", t.indexes.size());
+  if (!t.indexes.empty()) printf("  %-11s %-4s %-10s %-30s %s\n", "name", "type", "duplicates", "expression", "file");
+  for (const auto& x : t.indexes)
+    printf("  %-11s %-4s %-10s %-30s %s\n", x[0].c_str(), x[2].c_str(), x[3] == "unique" ? "no" : "yes",
+           x[1].c_str(), x[4].c_str());
+}
+
+// The same facts as one JSON document; `error` when the table was refused.
+void PrintInfoJson(const TableFacts& t, const std::string& error) {
+  std::string j = "{\"table\": " + Json(t.path);
+  auto num = [&](const char* key, const std::string& v) {
+    if (!v.empty()) j += std::string(", \"") + key + "\": " + v;
+  };
+  if (t.dialect >= 0) j += ", \"dialect\": " + std::to_string(t.dialect) + ", \"dialect_name\": " + Json(DialectName(t.dialect));
+  if (t.have_header) j += ", \"version_byte\": " + std::to_string(t.header.bytes[0]);
+  if (t.have_header && t.header.size > 29) {
+    j += ", \"codepage_byte\": " + std::to_string(t.header.bytes[29]);
+    j += ", \"production_index\": " + std::string(t.header.bytes[28] & 1 ? "true" : "false");
+  }
+  if (t.dialect >= 0)
+    j += ", \"codepage\": " + std::to_string(t.codepage.codepage) + ", \"codepage_origin\": " + Json(t.codepage_line);
+  num("records_in_header", t.records);
+  if (t.live >= 0) j += ", \"records_live\": " + std::to_string(t.live);
+  num("header_length", t.header_len);
+  num("record_length", t.record_len);
+  if (t.dialect >= 0) {
+    if (t.memo_file.empty()) j += ", \"memo\": null";
+    else
+      j += ", \"memo\": {\"file\": " + Json(t.memo_file) + ", \"kind\": " + Json(t.memo_kind) +
+           ", \"block_size\": " + (t.memo_block.empty() ? "0" : t.memo_block) + "}";
+    j += ", \"fields\": [";
+    for (size_t i = 0; i < t.fields.size(); ++i)
+      j += std::string(i ? ", " : "") + "{\"name\": " + Json(t.fields[i][0]) + ", \"type\": " + Json(t.fields[i][1]) +
+           ", \"width\": " + t.fields[i][2] + ", \"decimals\": " + t.fields[i][3] + "}";
+    j += "], \"indexes\": [";
+    for (size_t i = 0; i < t.indexes.size(); ++i) {
+      const auto& x = t.indexes[i];
+      j += std::string(i ? ", " : "") + "{\"name\": " + Json(x[0]) + ", \"expression\": " + Json(x[1]) +
+           ", \"key_type\": " + Json(x[2]) + ", \"unique\": " + (x[3] == "unique" ? "true" : "false") +
+           ", \"file\": " + Json(x[4]) + "}";
+    }
+    j += "]";
+  }
+  if (!error.empty()) j += ", \"error\": " + Json(error);
+  j += "}\n";
+  fputs(j.c_str(), stdout);
+}
+
 int CmdInfo(const Args& args) {
   if (args.files.size() != 1) return Usage("info takes one table");
+  bool json = args.format == "json";
+  if (!json && !args.format.empty() && args.format != "text")
+    return Usage("info --format takes text or json, not " + args.format);
+  TableFacts t;
+  t.path = args.files[0];
+  t.have_header = ReadTableHeader(t.path, &t.header) && t.header.size > 0 && KnownVersionByte(t.header.bytes[0]);
   SourcePtr spoke;
   CodePageChoice codepage;
-  if (int rc = OpenOrFail(args, &spoke, &codepage)) return rc;
-  auto facts = Facts(spoke.get());
-  auto fact = [&](const char* name) {
-    for (const auto& f : facts)
-      if (f.first == name) return f.second;
-    return std::string("?");
-  };
-  std::vector<std::string> descriptors;
-  for (const auto& f : facts)
-    if (f.first == "field") descriptors.push_back(f.second);
+  std::string error;
+  if (OpenSource(t.path, args.source, &spoke, &error, &codepage) != 0) {
+    // What could be read of a damaged table, then why it was refused.
+    if (t.have_header) HeaderFacts(&t);
+    if (json) PrintInfoJson(t, error);
+    else if (t.have_header && t.header.size >= 12) PrintInfoText(t);
+    fflush(stdout);
+    return Fail(error);
+  }
+  t.codepage = codepage;
+  t.codepage_line = CodePageLine(codepage);
+  for (const auto& f : Facts(spoke.get())) {
+    const std::string& k = f.first;
+    if (k == "version") t.version = f.second;
+    else if (k == "records") t.records = f.second;
+    else if (k == "header") t.header_len = f.second;
+    else if (k == "record") t.record_len = f.second;
+    else if (k == "memo") t.memo = f.second;
+    else if (k == "memo file") t.memo_file = f.second;
+    else if (k == "memo kind") t.memo_kind = f.second;
+    else if (k == "memo block") t.memo_block = f.second;
+    else if (k == "field" && SplitTabs(f.second).size() == 4) t.fields.push_back(SplitTabs(f.second));
+    else if (k == "index" && SplitTabs(f.second).size() == 5) t.indexes.push_back(SplitTabs(f.second));
+  }
   ZQString dialect;
   spoke->GetOption("version", dialect);
-  int d = atoi(dialect.c_str());
+  t.dialect = atoi(dialect.c_str());
+  // The layout's names: the code page applied.
+  ZQRecord* layout = spoke->GetLayout(0);
+  for (int i = 0; i < layout->FieldCount() && size_t(i) < t.fields.size(); ++i) t.fields[size_t(i)][0] = (*layout)[i]->Name();
   int64_t live = 0;
   BATCHERR rc;
   while ((rc = spoke->GetRecord(int32_t(live))) == 0) ++live;
-  if (rc != ZQ_END) return Fail(spoke->LastErrorMessage());
-  printf("table:       %s\n", args.files[0].c_str());
-  printf("dialect:     %d (%s)\n", d, DialectName(d));
-  printf("version:     %s\n", fact("version").c_str());
-  printf("records:     %s in the header, %lld live\n", fact("records").c_str(), static_cast<long long>(live));
-  printf("layout:      header %s bytes, record %s bytes\n", fact("header").c_str(), fact("record").c_str());
-  printf("memo:        %s\n", fact("memo").c_str());
-  printf("code page:   %s\n", CodePageLine(codepage).c_str());
-  ZQRecord* layout = spoke->GetLayout(0);
-  printf("fields:      %d\n", layout->FieldCount());
-  printf("  %-4s %-11s %-4s %5s %4s\n", "#", "name", "type", "width", "dec");
-  for (int i = 0; i < layout->FieldCount(); ++i) {
-    const ZQField* f = (*layout)[i];
-    std::string type = "?", width = std::to_string(f->Length()), dec = std::to_string(f->DecLen());
-    if (size_t(i) < descriptors.size()) {
-      // name, letter, width, decimals, separated by tabs
-      const std::string& x = descriptors[size_t(i)];
-      size_t a = x.rfind('\t');
-      size_t b = a == std::string::npos ? a : x.rfind('\t', a - 1);
-      size_t c = b == std::string::npos || b == 0 ? std::string::npos : x.rfind('\t', b - 1);
-      if (c != std::string::npos) {
-        type = x.substr(c + 1, b - c - 1);
-        width = x.substr(b + 1, a - b - 1);
-        dec = x.substr(a + 1);
-      }
-    }
-    printf("  %-4d %-11s %-4s %5s %4s\n", i + 1, f->Name(), type.c_str(), width.c_str(), dec.c_str());
+  if (rc != ZQ_END) {
+    error = ExplainTableError(t.path, spoke->LastErrorMessage());
+  } else {
+    t.live = live;
   }
-  // name, expression, key type, unique or not, file; separated by tabs
-  std::vector<std::vector<std::string>> indexes;
-  for (const auto& f : facts) {
-    if (f.first != "index") continue;
-    std::vector<std::string> parts;
-    size_t start = 0;
-    for (size_t tab; (tab = f.second.find('\t', start)) != std::string::npos; start = tab + 1)
-      parts.push_back(f.second.substr(start, tab - start));
-    parts.push_back(f.second.substr(start));
-    if (parts.size() == 5) indexes.push_back(parts);
-  }
-  printf("indexes:     %zu\n", indexes.size());
-  if (!indexes.empty()) printf("  %-11s %-4s %-10s %-30s %s\n", "name", "type", "duplicates", "expression", "file");
-  for (const auto& x : indexes)
-    printf("  %-11s %-4s %-10s %-30s %s\n", x[0].c_str(), x[2].c_str(), x[3] == "unique" ? "no" : "yes",
-           x[1].c_str(), x[4].c_str());
   spoke->ConnectionClose();
-  return 0;
+  if (json) PrintInfoJson(t, error);
+  else PrintInfoText(t);
+  fflush(stdout);
+  return error.empty() ? 0 : Fail(error);
 }
 
 int CmdFormats(const Args& args) {
@@ -318,14 +455,41 @@ int CmdFormats(const Args& args) {
   return 0;
 }
 
+// The positions of the fields named by --fields in `layout`, in the order
+// given. A usage error (exit status) for a name the layout doesn't hold.
+int SelectFields(const Args& args, const ZQRecord& layout, std::vector<int>* out) {
+  std::string error;
+  if (SelectFieldsByName(layout, args.fields, out, &error)) return 0;
+  return Usage(error);
+}
+
+// The name of the table a database or script holds (--table, else the base
+// name of the source `path` without its extension).
+std::string TableName(const Args& args, const std::string& path) {
+  if (!args.read_table.empty()) return args.read_table;
+  return BaseName(path);
+}
+
 int CmdCat(const Args& args) {
   if (args.files.size() != 1) return Usage("cat takes one table");
+  OutputFormat format = OutputFormat::kCsv;
+  if (!args.format.empty() && !ParseFormat(args.format, &format))
+    return Usage("cat --format takes csv, jsonl, table or pgsql, not " + args.format);
+  const std::string& path = args.files[0];
+  ReadOptions read;
+  read.table = args.source;
+  read.table_name = args.read_table;
   SourcePtr spoke;
-  if (int rc = OpenOrFail(args, &spoke)) return rc;
-  OutBuf out(STDOUT_FILENO);
-  std::unique_ptr<RecordWriter> writer = MakeWriter(args.format, out);
+  std::string error;
+  const Endpoint& from = SourceEndpoint(path);
+  if (!from.open_source(path, read, &spoke, &error)) return Fail(error);
   ZQRecord& record = *spoke->GetLayout(0);
   TableReadFix fix(spoke.get());
+  std::vector<int> columns;
+  if (int rc = SelectFields(args, record, &columns)) return rc;
+  OutBuf out(STDOUT_FILENO);
+  std::unique_ptr<RecordWriter> writer = MakeWriter(format, out, TableName(args, path));
+  writer->Select(columns);
   writer->Begin(record);
   BATCHERR rc;
   int32_t n = 0;
@@ -334,9 +498,9 @@ int CmdCat(const Args& args) {
     writer->Row(record);
     if (++n == INT32_MAX) break;
   }
-  writer->End();
+  std::string message = rc != ZQ_END ? ExplainTableError(path, spoke->LastErrorMessage()) : "";
+  if (message.empty()) writer->End();  // a script cut short never commits
   bool written = out.Flush();
-  std::string message = rc != ZQ_END ? spoke->LastErrorMessage() : "";
   spoke->ConnectionClose();
   if (!message.empty()) return Fail(message);
   if (!written) return Fail("cannot write the output");
@@ -347,14 +511,20 @@ int CmdKeys(const Args& args) {
   if (args.files.size() != 1) return Usage("keys takes one table");
   if (args.keys.index.empty()) return Usage("keys needs --index NAME");
   if (!args.convert.write.table.indexes.empty()) return Usage("keys takes --index NAME, without =EXPR");
-  if (args.format == OutputFormat::kTable) return Usage("keys writes csv or jsonl");
+  if (!args.format.empty() && args.format != "csv" && args.format != "jsonl")
+    return Usage("keys --format takes csv or jsonl, not " + args.format);
   SourcePtr spoke;
   if (int rc = OpenOrFail(args, &spoke)) return rc;
   KeysOptions opts = args.keys;
-  opts.jsonl = args.format == OutputFormat::kJsonl;
+  opts.jsonl = args.format == "jsonl";
   int rc = WriteKeys(spoke.get(), opts);
   spoke->ConnectionClose();
   return rc;
+}
+
+// True when `o` was given on the command line.
+bool Given(const Args& args, const char* o) {
+  return std::find(args.seen.begin(), args.seen.end(), o) != args.seen.end();
 }
 
 int CmdConvert(const Args& args) {
@@ -362,20 +532,44 @@ int CmdConvert(const Args& args) {
   if (!args.keys.index.empty()) return Usage("--index takes NAME=EXPR, not " + args.keys.index);
   if (args.keys.has_seek || args.keys.reverse) return Usage("--seek and --reverse go with keys");
   if (args.convert.write.mode != 2 && !args.convert.key.empty()) return Usage("--key goes with --mode update");
-  if (IsForeignTargetName(args.files[1]))
-    return Usage("zqdb writes tables, CSV and JSON-lines files, not " + args.files[1] +
-                 " (name it .dbf, .csv or .jsonl, or - for standard output)");
-  if (args.files[1] == "-" && args.format == OutputFormat::kTable) return Usage("convert writes csv or jsonl to -");
+  bool to_stdout = args.files[1] == "-";
+  if (IsForeignTargetName(args.files[1]) && args.format.empty())
+    return Usage("zqdb writes tables, CSV, JSON-lines, SQLite and PostgreSQL files, not " + args.files[1] +
+                 " (name it .dbf, .csv, .jsonl, .sqlite or .sql, give --format, or - for standard output)");
+  if (to_stdout && !args.format.empty() && args.format != "csv" && args.format != "jsonl" && args.format != "json")
+    return Usage("convert writes csv or jsonl to -");
   if (args.files[1] == "-" && !args.convert.write.table.dialect.empty())
     return Usage("a table can't be written to standard output (--to goes with a table target)");
   ConvertOptions opts = args.convert;
-  opts.stdout_jsonl = args.format == OutputFormat::kJsonl;
+  opts.stdout_jsonl = args.format == "jsonl" || args.format == "json";
+  const Endpoint* to = to_stdout ? FindEndpoint(opts.stdout_jsonl ? "jsonl" : "csv") : &TargetEndpoint(args.files[1]);
+  if (!args.format.empty() && !to_stdout) {
+    to = FindEndpoint(args.format == "json" ? "jsonl" : args.format);
+    if (to == nullptr || to->make_target == nullptr) {
+      std::string names;
+      for (const Endpoint* e : Endpoints())
+        if (e->make_target != nullptr) names += std::string(names.empty() ? "" : ", ") + e->name;
+      return Usage("convert --format takes " + names + ", not " + args.format);
+    }
+  }
+  // The options of table targets mean nothing to another target.
+  if (std::string(to->name) != "dbf")
+    for (const char* o : {"to", "index", "unique-index", "index-form"})
+      if (Given(args, o)) return Usage(std::string("--") + o + " goes with a table target, not " + to->name);
+  opts.target = to_stdout ? nullptr : to;
+  opts.fields = args.fields;
   opts.read.table = args.source;
+  opts.read.table_name = args.read_table;
+  // --table names the table of a database on either side; a new one is
+  // named after the source file otherwise (customers.dbf -> customers).
+  opts.write.table_name = TableName(args, args.files[0]);
   opts.write.table.type = args.source.type;
   opts.write.table.codepage = args.to_codepage != kCodePageUnset ? args.to_codepage : args.codepage;
   opts.write.table.memo_policy = args.source.memo_policy;
   return RunConvert(args.files[0], args.files[1], opts);
 }
+
+int CmdHelp(const Args& args);
 
 // The commands. A new one is a function and a row.
 struct Command {
@@ -384,17 +578,41 @@ struct Command {
   const char* summary;
   int (*run)(const Args& args);
   bool reads_tables;     // the module scan's warnings, and the dialect names, first
+  const char* options;   // the options it takes, blank-separated, without "--"
+  const char* examples;  // its help's examples, one a line
 };
 
+// The options of every command that opens a table.
+#define ZQ_TABLE_OPTIONS "dialect type modules codepage memo quiet strict "
+
 const Command kCommands[] = {
-    {"info", "info TABLE", "dialect, version byte, record counts and fields", CmdInfo, true},
-    {"cat", "cat TABLE", "the live records (--format csv|jsonl|table)", CmdCat, true},
-    {"convert", "convert SRC DST", "records from a table or CSV file to a table, CSV or JSON-lines file", CmdConvert,
-     true},
+    {"info", "info TABLE", "dialect, version byte, record counts, memo file, fields and indexes", CmdInfo, true,
+     ZQ_TABLE_OPTIONS "format",
+     "zqdb info customers.dbf\n"
+     "zqdb info customers.dbf --format json | python3 -m json.tool\n"},
+    {"cat", "cat TABLE", "the live records (--format csv|jsonl|table|pgsql)", CmdCat, true,
+     ZQ_TABLE_OPTIONS "format fields table",
+     "zqdb cat customers.dbf --format table\n"
+     "zqdb cat customers.dbf --fields NAME,CITY --format jsonl\n"
+     "zqdb cat customers.dbf --format pgsql | psql -d shop\n"},
+    {"convert", "convert SRC DST", "records from a table, CSV file or SQLite database to a table, CSV, JSON-lines, "
+     "SQLite or PostgreSQL file", CmdConvert, true,
+     ZQ_TABLE_OPTIONS "format fields table to mode key schema index unique-index index-form no-progress from-codepage "
+                      "to-codepage",
+     "zqdb convert customers.dbf customers.csv\n"
+     "zqdb convert customers.dbf shop.sqlite --table customers\n"
+     "zqdb convert customers.dbf customers.sql --format pgsql\n"
+     "zqdb convert new.csv customers.dbf --mode update --key ID\n"},
     {"keys", "keys TABLE --index NAME", "the keys of an index in key order, with their record numbers", CmdKeys,
-     true},
-    {"formats", "formats", "the connector definitions of the modules found", CmdFormats, false},
+     true, ZQ_TABLE_OPTIONS "format index seek reverse",
+     "zqdb keys customers.dbf --index NAME\n"
+     "zqdb keys customers.dbf --index NAME --seek M --reverse\n"},
+    {"formats", "formats", "the connector definitions of the modules found", CmdFormats, false, "modules",
+     "zqdb formats\n"},
+    {"help", "help [COMMAND]", "this text, or a command's usage with examples", CmdHelp, false, "", "zqdb help convert\n"},
 };
+
+#undef ZQ_TABLE_OPTIONS
 
 const Command* FindCommand(const std::string& name) {
   for (const Command& c : kCommands)
@@ -402,10 +620,66 @@ const Command* FindCommand(const std::string& name) {
   return nullptr;
 }
 
+// True when the blank-separated `list` holds `word`.
+bool ListHas(const char* list, const std::string& word) {
+  std::string padded = std::string(" ") + list + " ";
+  return padded.find(" " + word + " ") != std::string::npos;
+}
+
 void PrintUsage(FILE* out) {
   fputs("usage: zqdb COMMAND [options] FILE...\n\ncommands:\n", out);
   for (const Command& c : kCommands) fprintf(out, "  %-25s%s\n", c.synopsis, c.summary);
-  fputs(kOptionsUsage, out);
+  fputs("\n\"zqdb help COMMAND\" or \"zqdb COMMAND --help\" shows a command's options and examples;\n"
+        "\"zqdb --version\" the versions of zqdb and of the connector modules found.\n", out);
+}
+
+void PrintCommandUsage(const Command& c, FILE* out) {
+  fprintf(out, "usage: zqdb %s [options]\n\n%s.\n\noptions (before or after the file names):\n", c.synopsis,
+          c.summary);
+  for (const OptionHelp& o : kOptionHelp)
+    if (ListHas(c.options, o.name)) fputs(o.text, out);
+  fputs("  --help                   this text\n\nexamples:\n", out);
+  for (const char* p = c.examples; *p;) {
+    const char* nl = strchr(p, '\n');
+    fprintf(out, "  %.*s\n", int(nl - p), p);
+    p = nl + 1;
+  }
+}
+
+int CmdHelp(const Args& args) {
+  if (args.files.empty()) {
+    PrintUsage(stdout);
+    return 0;
+  }
+  const Command* c = args.files.size() == 1 ? FindCommand(args.files[0]) : nullptr;
+  if (c == nullptr) return Usage("help takes one command name, not " + args.files[0]);
+  PrintCommandUsage(*c, stdout);
+  return 0;
+}
+
+// The version of zqdb, and of each connector module found: its file and
+// the definitions it carries.
+int PrintVersion() {
+  printf("zqdb %s\n", ZQ_VERSION);
+  ModuleRegistry& r = ModuleRegistry::Get();
+  std::vector<std::string> files;
+  for (const ConnectorDef& d : r.Definitions())
+    if (std::find(files.begin(), files.end(), d.file) == files.end()) files.push_back(d.file);
+  for (const std::string& f : files) {
+    int n = 0;
+    for (const ConnectorDef& d : r.Definitions()) n += d.file == f;
+    printf("module %s: %d connector definitions\n", f.c_str(), n);
+  }
+  if (files.empty()) printf("no connector module found\n");
+  return 0;
+}
+
+// A usage error for the first option `c` doesn't take.
+int CheckOptions(const Command& c, const Args& args) {
+  for (const std::string& o : args.seen)
+    if (o != "help" && o != "version" && !ListHas(c.options, o))
+      return Usage(std::string(c.name) + " takes no option --" + o);
+  return 0;
 }
 
 // What every command that reads tables checks first: the warnings of the
@@ -448,10 +722,22 @@ int ZqdbMain(int argc, char** argv) {
   SetConsoleSink(ConsoleToStderr);
   Args args;
   if (int rc = ParseArgs(argc, argv, &args)) return rc;
+  if (args.version && args.command.empty()) return PrintVersion();
   const Command* command = FindCommand(args.command);
+  if (args.help) {
+    if (command == nullptr && !args.command.empty()) return Usage("unknown command " + args.command);
+    if (command == nullptr) PrintUsage(stdout);
+    else PrintCommandUsage(*command, stdout);
+    return 0;
+  }
+  if (command != nullptr)
+    if (int rc = CheckOptions(*command, args)) return rc;
   // An unknown command is told after those checks, as it always was.
   if (command == nullptr || command->reads_tables)
     if (int rc = CheckTableOptions(args)) return rc;
   if (command == nullptr) return Usage("unknown command " + args.command);
-  return command->run(args);
+  int rc = command->run(args);
+  FlushWarnings();
+  if (rc == 0 && WarningsFail()) rc = 1;
+  return rc;
 }

@@ -7,13 +7,16 @@
 #include <memory>
 #include <string>
 
+#include "engine/dbf_source.h"
 #include "engine/field_plan.h"
 #include "engine/report.h"
 #include "engine/target_path.h"
 #include "engine/transfer.h"
 
 int RunConvert(const std::string& src, const std::string& named, const ConvertOptions& opts) {
-  const Endpoint& to = named != "-" ? TargetEndpoint(named) : *FindEndpoint(opts.stdout_jsonl ? "jsonl" : "csv");
+  const Endpoint& to = opts.target != nullptr ? *opts.target
+                       : named != "-"        ? TargetEndpoint(named)
+                                             : *FindEndpoint(opts.stdout_jsonl ? "jsonl" : "csv");
   std::string dst, error;
   if (!ResolveTargetPath(named, strcmp(to.name, "dbf") == 0, &dst, &error)) return Fail(error);
   const Endpoint& from = SourceEndpoint(src);
@@ -29,6 +32,11 @@ int RunConvert(const std::string& src, const std::string& named, const ConvertOp
     read.into = [&](ZQRecord* layout) { return to.read_layout(dst, write, layout); };
   SourcePtr source;
   if (!from.open_source(src, read, &source, &error)) return Fail(error);
+  std::vector<int> select;
+  if (!SelectFieldsByName(*source->GetLayout(0), opts.fields, &select, &error)) {
+    fprintf(stderr, "zqdb: %s (zqdb --help shows the usage)\n", error.c_str());
+    return 2;
+  }
   std::unique_ptr<Target> target = to.make_target(dst, write, source.get(), &error);
   if (!target) return Fail(error);
   ZQExport* spoke = target->spoke();
@@ -37,11 +45,13 @@ int RunConvert(const std::string& src, const std::string& named, const ConvertOp
   spoke->SetMode(mode);
 
   FieldPlan plan;
-  if (!plan.Make(*source->GetLayout(0), spoke, dst, target->AddsToExisting(), &error)) return Fail(error);
+  if (!plan.Make(*source->GetLayout(0), spoke, dst, target->AddsToExisting(), select, &error)) return Fail(error);
   plan.SetTextCodePage(target->TextCodePage(), write.table.strict);
   std::vector<int> key;
   if (!plan.FindKey(opts.key, &key, &error)) return Fail(error);
   if (opts.write.mode == 2 && key.empty()) return Fail("update mode needs --key");
+  // Under --strict a warning of the layout stops the run before any output.
+  if (WarningsFail()) return FlushWarnings(), Fail("nothing was written: --strict makes the warnings above errors");
   // Append and update change a table in place: every value is checked
   // before the first byte is written, so that a bad one leaves the table,
   // its memo file and its index files as they were.
@@ -58,6 +68,15 @@ int RunConvert(const std::string& src, const std::string& named, const ConvertOp
   }
   TransferCounts counts;
   bool ok = Transfer(source.get(), spoke, plan, keyed.get(), opts.progress, &counts, &error);
+  if (!ok && std::string(from.name) == "dbf") error = ExplainTableError(src, error);
+  // Values changed on the way are told before the output is kept, so that
+  // --strict can refuse it.
+  if (ok) plan.WarnLosses(target->KeepsBlankLogicals());
+  if (ok && WarningsFail()) {
+    ok = false;
+    error = "nothing was written: --strict makes the warnings above errors";
+    FlushWarnings();
+  }
   if (spoke->_CloseOutput(ok) != 0 && ok) {
     ok = false;
     error = spoke->LastErrorMessage();
@@ -65,7 +84,6 @@ int RunConvert(const std::string& src, const std::string& named, const ConvertOp
   source->ConnectionClose();
   if (ok) ok = target->Finish(counts.added, &error);
   if (!ok) return Fail(error);
-  plan.WarnLosses(target->KeepsBlankLogicals());
   if (opts.write.mode == 2)
     fprintf(stderr, "zqdb: %lld records updated, %lld added\n", static_cast<long long>(counts.updated),
             static_cast<long long>(counts.added));

@@ -16,6 +16,8 @@ struct ConvertOptions {
   std::vector<std::string> key;  // update mode: the fields that find a record
   bool progress = true;          // on a terminal, for runs over a second
   bool stdout_jsonl = false;     // the target "-": JSON lines, not CSV
+  const Endpoint* target = nullptr;  // --format; null: by the target's name
+  std::vector<std::string> fields;   // --fields: the source fields that go, in order
 };
 
 // Runs the conversion; the exit status (0, or 1 with the message printed).

@@ -1,10 +1,14 @@
 #include "engine/dbf_source.h"
 
+#include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cctype>
+#include <cerrno>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 
 #include "engine/endpoints.h"
 #include "host/zqutil.h"
@@ -103,6 +107,92 @@ int GuessDialect(const std::string& path) {
   }
 }
 
+bool ReadTableHeader(const std::string& path, TableHeader* out) {
+  int fd = open(path.c_str(), O_RDONLY | O_CLOEXEC);
+  if (fd < 0) return false;
+  struct stat st;
+  ssize_t n = fstat(fd, &st) == 0 && S_ISREG(st.st_mode) ? read(fd, out->bytes, sizeof out->bytes) : -1;
+  close(fd);
+  if (n < 0) return false;
+  out->size = n;
+  out->file_size = int64_t(st.st_size);
+  return true;
+}
+
+namespace {
+
+}  // namespace
+
+bool KnownVersionByte(uint8_t v) {
+  switch (v) {
+    case 0x02: case 0x03: case 0x04: case 0x05: case 0x30: case 0x31: case 0x32: case 0x43: case 0x63:
+    case 0x7B: case 0x83: case 0x8B: case 0x8E: case 0xB3: case 0xCB: case 0xE5: case 0xF5: case 0xFB:
+    case 0xFE:
+      return true;
+    default:
+      return false;
+  }
+}
+
+namespace {
+
+// Why a table could not be opened, as the operating system or the first
+// bytes tell it; "" when neither tells anything.
+std::string WhyNotOpened(const std::string& path) {
+  struct stat st;
+  if (stat(path.c_str(), &st) != 0) return strerror(errno);
+  if (S_ISDIR(st.st_mode)) return "is a directory";
+  if (!S_ISREG(st.st_mode)) return "not a regular file";
+  if (access(path.c_str(), R_OK) != 0) return strerror(errno);
+  if (st.st_size == 0) return "empty file";
+  TableHeader h;
+  if (!ReadTableHeader(path, &h)) return strerror(errno);
+  char buf[96];
+  if (!KnownVersionByte(h.bytes[0])) {
+    snprintf(buf, sizeof buf, "not a table (version byte 0x%02X)", unsigned(h.bytes[0]));
+    return buf;
+  }
+  if (h.size < int64_t(sizeof h.bytes)) {
+    snprintf(buf, sizeof buf, "too short for a table header (%lld bytes)", static_cast<long long>(h.size));
+    return buf;
+  }
+  uint32_t header_len = uint32_t(h.bytes[8] | h.bytes[9] << 8);
+  if (h.bytes[0] != 0x02 && header_len > h.file_size) {
+    snprintf(buf, sizeof buf, "cut short: the header says %u bytes, the file has %lld", unsigned(header_len),
+             static_cast<long long>(h.file_size));
+    return buf;
+  }
+  return "";
+}
+
+// The memo file of a table: the first of its base name with a memo
+// extension that exists, else the .dbt name.
+std::string MemoFileOf(const std::string& path) {
+  std::string base = path;
+  size_t dot = base.rfind('.');
+  if (dot != std::string::npos && base.find('/', dot) == std::string::npos) base.resize(dot);
+  for (const char* ext : {".dbt", ".DBT", ".fpt", ".FPT", ".smt", ".SMT"})
+    if (access((base + ext).c_str(), F_OK) == 0) return base + ext;
+  return base + ".dbt";
+}
+
+bool StartsWith(const std::string& s, const char* prefix) { return s.rfind(prefix, 0) == 0; }
+
+}  // namespace
+
+std::string ExplainTableError(const std::string& path, const std::string& message) {
+  if (StartsWith(message, "Error opening data file")) {
+    std::string why = WhyNotOpened(path);
+    return why.empty() ? message : message + ": " + why;
+  }
+  if (StartsWith(message, "Could not open memo file") || StartsWith(message, "Memo problem")) {
+    std::string memo = MemoFileOf(path);
+    std::string why = access(memo.c_str(), R_OK) != 0 ? std::string(": ") + strerror(errno) : "";
+    return message + " (" + memo + why + ")";
+  }
+  return message;
+}
+
 bool ResolveConnector(const std::string& type, TableConnector* out, std::string* error) {
   ModuleRegistry& r = ModuleRegistry::Get();
   const ConnectorDef* def = type.empty() ? r.Default() : r.ByShortName(type);
@@ -177,7 +267,7 @@ BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePt
   if (rc == 0) rc = spoke->MakeFields();
   if (rc != 0) {
     const char* message = spoke->LastErrorMessage();
-    *error = message[0] ? message : "cannot open " + path;
+    *error = message[0] ? ExplainTableError(path, message) : "cannot open " + path;
     spoke->ConnectionClose();
     return rc;
   }

@@ -4,6 +4,7 @@
 // definitions, as the integration engine applies them.
 #pragma once
 
+#include <cstdint>
 #include <string>
 
 #include "engine/codepages.h"
@@ -42,6 +43,25 @@ int GuessDialect(const std::string& path);
 // True when a file of the table's base name with the extension `ext` (in
 // lower or upper case) lies beside it.
 bool HasSibling(const std::string& path, const std::string& ext);
+
+// The first bytes of a table file, read by the engine itself: for the facts
+// of a table the module refuses, and for the reason it was refused.
+struct TableHeader {
+  uint8_t bytes[32] = {};
+  int64_t size = 0;       // bytes read (fewer than 32 in a short file)
+  int64_t file_size = 0;
+};
+// Version bytes of the tables the module reads (the low bits name the
+// format; the high ones memo and SQL flags).
+bool KnownVersionByte(uint8_t v);
+// False when `path` is no regular file that can be read.
+bool ReadTableHeader(const std::string& path, TableHeader* out);
+
+// The module's message about the table `path`, with what the operating
+// system said or what was found instead of a table ("No such file or
+// directory", "is a directory", "empty file", "not a table (version byte
+// 0x50)"), and the memo file's name in memo errors.
+std::string ExplainTableError(const std::string& path, const std::string& message);
 
 // Opens `path`; on failure `error` holds the spoke's message and the result
 // is the spoke's code (non-zero). `chosen`, when given, tells how the code

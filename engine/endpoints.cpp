@@ -11,6 +11,8 @@ namespace {
 const Endpoint kEndpoints[] = {
     {"csv", ".csv", OpenCsvSource, MakeCsvTarget, nullptr},
     {"jsonl", ".jsonl .json", nullptr, MakeJsonlTarget, nullptr},
+    {"sqlite", ".sqlite .sqlite3 .db3", OpenSqliteSource, MakeSqliteTarget, ReadSqliteLayout},
+    {"pgsql", ".sql .pgsql", nullptr, MakePgsqlTarget, nullptr},
     {"dbf", "", OpenTableSource, MakeTableTarget, ReadTableLayout},
 };
 
@@ -41,6 +43,12 @@ const Endpoint* FindEndpoint(const std::string& name) {
   for (const Endpoint& e : kEndpoints)
     if (name == e.name) return &e;
   return nullptr;
+}
+
+std::vector<const Endpoint*> Endpoints() {
+  std::vector<const Endpoint*> all;
+  for (const Endpoint& e : kEndpoints) all.push_back(&e);
+  return all;
 }
 
 bool Target::Open(std::string* error) {

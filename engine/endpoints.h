@@ -19,6 +19,7 @@
 struct ReadOptions {
   SourceOptions table;  // tables: --type, --dialect, --codepage, --memo
   std::string schema;   // CSV: --schema, the column types
+  std::string table_name;  // SQLite: --table, the table read ("" = the only one, or the file's base name)
   // The layout of the existing table the records are added to (append and
   // update), for a source that types its columns by it (CSV: "y" read for a
   // text field stays "y", not a logical). Unset, or false: there is none.
@@ -50,6 +51,7 @@ struct TableWriteOptions {
 struct WriteOptions {
   int mode = 0;             // 0 replace, 1 append, 2 update
   TableWriteOptions table;  // the settings of table targets
+  std::string table_name;   // SQLite, pgsql: the table written
 };
 
 // A target spoke, and what its format does around the records: a table
@@ -111,6 +113,8 @@ const Endpoint& SourceEndpoint(const std::string& path);
 const Endpoint& TargetEndpoint(const std::string& path);
 // The row of that name, or null.
 const Endpoint* FindEndpoint(const std::string& name);
+// Every row, in order.
+std::vector<const Endpoint*> Endpoints();
 
 // The factories, one file per format.
 bool OpenTableSource(const std::string& path, const ReadOptions& opts, SourcePtr* out, std::string* error);
@@ -120,5 +124,11 @@ bool ReadTableLayout(const std::string& path, const WriteOptions& opts, ZQRecord
 bool OpenCsvSource(const std::string& path, const ReadOptions& opts, SourcePtr* out, std::string* error);
 std::unique_ptr<Target> MakeCsvTarget(const std::string& path, const WriteOptions& opts, ZQImport* source,
                                       std::string* error);
+std::unique_ptr<Target> MakePgsqlTarget(const std::string& path, const WriteOptions& opts, ZQImport* source,
+                                        std::string* error);
+bool OpenSqliteSource(const std::string& path, const ReadOptions& opts, SourcePtr* out, std::string* error);
+std::unique_ptr<Target> MakeSqliteTarget(const std::string& path, const WriteOptions& opts, ZQImport* source,
+                                         std::string* error);
+bool ReadSqliteLayout(const std::string& path, const WriteOptions& opts, ZQRecord* out);
 std::unique_ptr<Target> MakeJsonlTarget(const std::string& path, const WriteOptions& opts, ZQImport* source,
                                         std::string* error);

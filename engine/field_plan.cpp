@@ -10,8 +10,28 @@
 #include "host/codepage.h"
 #include "host/zqglob.h"
 
-bool FieldPlan::Make(ZQRecord& in, ZQExport* target, const std::string& path, bool existing, std::string* error) {
+bool SelectFieldsByName(const ZQRecord& layout, const std::vector<std::string>& names, std::vector<int>* out,
+                        std::string* error) {
+  for (const std::string& name : names) {
+    int found = -1;
+    for (int i = 0; i < layout.FieldCount() && found < 0; ++i)
+      if (Lower(layout[i]->Name()) == Lower(name)) found = i;
+    if (found < 0) {
+      *error = "--fields: no field " + name + "; the fields are";
+      for (int i = 0; i < layout.FieldCount(); ++i) *error += (i ? ", " : " ") + std::string(layout[i]->Name());
+      return false;
+    }
+    out->push_back(found);
+  }
+  return true;
+}
+
+bool FieldPlan::Make(ZQRecord& in, ZQExport* target, const std::string& path, bool existing,
+                     const std::vector<int>& select, std::string* error) {
   in_ = &in;
+  select_ = select;
+  if (select_.empty())
+    for (int i = 0; i < in.FieldCount(); ++i) select_.push_back(i);
   out_ = target->GetLayout(0);
   out_->ClearFields();
   routes_.clear();
@@ -41,22 +61,27 @@ bool FieldPlan::Make(ZQRecord& in, ZQExport* target, const std::string& path, bo
 void FieldPlan::Match(ZQExport* target) {
   ZQRecord& in = *in_;
   ZQRecord& out = *out_;
-  std::vector<bool> used(size_t(in.FieldCount()), false);
+  // Fields not selected count as used: they feed nothing.
+  std::vector<bool> used(size_t(in.FieldCount()), true);
+  for (int i : select_) used[size_t(i)] = false;
   for (int j = 0; j < out.FieldCount(); ++j) {
     ZQField* f = out[j];
     target->FormatSpokeField(f, nullptr);
     int match = -1;
-    for (int i = 0; i < in.FieldCount() && match < 0; ++i)
-      if (!used[size_t(i)] && (Lower(in[i]->Name()) == Lower(f->Name()) ||
+    for (int i : select_)
+      if (match < 0 && !used[size_t(i)] && (Lower(in[i]->Name()) == Lower(f->Name()) ||
                                Lower(TargetName(target, in[i]->Name(), {})) == Lower(f->Name())))
         match = i;
-    if (match < 0) Warn(std::string("field ") + f->Name() + " of the table has no source field: left blank");
+    if (match < 0) WarnOf("field of the table has no source field and is left blank",
+                          "fields of the table have no source field and are left blank", f->Name());
     else used[size_t(match)] = true;
     routes_.push_back(FieldRoute{match, f->Name(), FieldCheck{char(f->DataType().Usage()), f->Length(),
                                                                int16_t(f->DecLen())}});
   }
-  for (int i = 0; i < in.FieldCount(); ++i)
-    if (!used[size_t(i)]) Warn(std::string("field ") + in[i]->Name() + " is left out: the table has no such field");
+  for (int i : select_)
+    if (!used[size_t(i)])
+      WarnOf("source field is left out: the table has no such field",
+             "source fields are left out: the table has no such fields", in[i]->Name());
 }
 
 // A new layout: each source field in a name and the nearest type the target
@@ -65,7 +90,7 @@ bool FieldPlan::Plan(ZQExport* target, std::string* error) {
   ZQRecord& in = *in_;
   int cap = std::min(target->MaxFieldCount(), target->MaxNewFieldCount());
   std::vector<std::string> names;
-  for (int i = 0; i < in.FieldCount(); ++i) {
+  for (int i : select_) {
     ZQField* s = in[i];
     if (int(routes_.size()) == cap) {
       Warn(std::string("field ") + s->Name() + " and those behind it are left out: the target keeps " +
@@ -74,12 +99,16 @@ bool FieldPlan::Plan(ZQExport* target, std::string* error) {
     }
     Planned plan;
     if (!PlanType(target, s, &plan)) {
-      Warn(std::string("field ") + s->Name() + " is left out: the target has no type for it");
+      WarnOf("field is left out: the target has no type for it", "fields are left out: the target has no type for them",
+             s->Name());
       continue;
     }
     std::string name = TargetName(target, s->Name(), names);
-    if (name != s->Name()) Warn(std::string("field ") + s->Name() + " is named " + name + " in the target");
-    if (!plan.change.empty()) Warn(std::string("field ") + s->Name() + ": " + plan.change);
+    if (name != s->Name()) {
+      if (Upper(s->Name()) == name) WarnOf("field name was upper-cased", "field names were upper-cased", s->Name() + (" -> " + name));
+      else WarnOf("field name was changed", "field names were changed", s->Name() + (" -> " + name));
+    }
+    if (!plan.change.empty()) WarnOf("field type was changed", "field types were changed", s->Name() + (": " + plan.change));
     ZQField* f = out_->NewField(plan.type, name.c_str());
     if (f == nullptr) return *error = "out of memory", false;
     target->FormatSpokeField(f, s);
@@ -116,7 +145,7 @@ bool FieldPlan::Fill(int32_t n, std::string* error, bool again) {
     ZQField* f = out[int(i)];
     if (r.from < 0) {
       f->Blank();
-    } else if (!CopyValue(f, in[r.from], &r.check)) {
+    } else if (int64_t cut = r.check.cut; !CopyValue(f, in[r.from], &r.check)) {
       const ZQString& v = in[r.from]->StringRef();
       std::string type(1, r.check.letter);
       if (r.check.letter == 'N' || r.check.letter == 'F')
@@ -128,6 +157,12 @@ bool FieldPlan::Fill(int32_t n, std::string* error, bool again) {
       return false;
     } else if (codepage_ != 0 && (r.check.letter == 'C' || r.check.letter == 'M') &&
                f->held() == ZQField::Held::kText && !CheckText(n, r, f, again, error)) {
+      return false;
+    } else if (r.check.cut > cut && Warnings() == WarnMode::kStrict) {
+      const ZQString& v = in[r.from]->StringRef();
+      *error = "record " + std::to_string(n + 1) + ", field " + r.name + ": \"" +
+               std::string(v.c_str(), size_t(v.length() < 40 ? v.length() : 40)) + "\" would be cut to " +
+               std::to_string(r.check.width) + " bytes (--strict)";
       return false;
     }
   }
@@ -170,13 +205,13 @@ void FieldPlan::ResetCounts() {
 void FieldPlan::WarnLosses(bool keeps_blank_logicals) const {
   for (const FieldRoute& r : routes_)
     if (r.check.cut > 0)
-      Warn(std::string("field ") + r.name + ": " + std::to_string(r.check.cut) + " values longer than " +
-           std::to_string(r.check.width) + " bytes were cut");
+      WarnOf("field had values cut to its width", "fields had values cut to their width",
+             r.name + ": " + std::to_string(r.check.cut) + " longer than " + std::to_string(r.check.width) + " bytes");
   if (unmappable_ > 0)
     Warn(std::to_string(unmappable_) + " characters that code page " + std::to_string(codepage_) +
          " can't hold were written as ? (the first in " + first_unmappable_ + "; --strict refuses them)");
   for (const FieldRoute& r : routes_)
     if (r.check.blank_logicals > 0 && !keeps_blank_logicals)
-      Warn(std::string("field ") + r.name + ": " + std::to_string(r.check.blank_logicals) +
-           " blank logicals were written as F");
+      WarnOf("logical field had blanks written as F", "logical fields had blanks written as F",
+             r.name + ": " + std::to_string(r.check.blank_logicals));
 }

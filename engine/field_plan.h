@@ -19,13 +19,22 @@ struct FieldRoute {
   FieldCheck check;   // its type letter and width, and what its values lost
 };
 
+// The positions in `layout` of the fields `names` (any case), in that
+// order. False with `error` naming the first unknown name and listing the
+// layout's fields.
+bool SelectFieldsByName(const ZQRecord& layout, const std::vector<std::string>& names, std::vector<int>* out,
+                        std::string* error);
+
 class FieldPlan {
  public:
   // Lays out layout 0 of `target` for the records of `in`: with `existing`,
   // the fields of the file `path` (records added to it), else fields made
   // from the source's. Each change on the way (a name changed, a type
   // mapped, a field left out) is warned of. False with `error` set.
-  bool Make(ZQRecord& in, ZQExport* target, const std::string& path, bool existing, std::string* error);
+  // `select` (--fields) names the source fields that go, in their order;
+  // empty: all of them.
+  bool Make(ZQRecord& in, ZQExport* target, const std::string& path, bool existing, const std::vector<int>& select,
+            std::string* error);
 
   // The target fields named by `names` (by a source or a target field's
   // name), for update mode's key. False with `error` set.
@@ -58,6 +67,7 @@ class FieldPlan {
 
   bool CheckText(int32_t n, const FieldRoute& r, ZQField* f, bool again, std::string* error);
 
+  std::vector<int> select_;  // the source fields that go, in order
   ZQRecord* in_ = nullptr;
   ZQRecord* out_ = nullptr;
   std::vector<FieldRoute> routes_;

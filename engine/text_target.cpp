@@ -11,7 +11,8 @@
 #include "engine/endpoints.h"
 #include "engine/text_types.h"
 
-ZQToText::ZQToText(OutputFormat format) : ZQExport(ZQSpokeDef{}, nullptr, false), format_(format) {
+ZQToText::ZQToText(OutputFormat format, const std::string& table)
+    : ZQExport(ZQSpokeDef{}, nullptr, false), format_(format), table_(table) {
   ReplaceValidTypes(const_cast<const ZQDType**>(TextTypes::Get().list));
 }
 
@@ -33,7 +34,7 @@ BATCHERR ZQToText::_OpenOutput(const ZQConnTarget& target) {
   }
   if (fd_ < 0) return LogError(4, ZQ_CREATE_ERROR, "cannot create %s: %s", final_path_.c_str(), strerror(errno));
   out_ = std::make_unique<OutBuf>(fd_);
-  writer_ = MakeWriter(format_, *out_);
+  writer_ = MakeWriter(format_, *out_, table_);
   writer_->Begin(*GetLayout(0));
   target_.path = target.path;
   return 0;
@@ -70,10 +71,10 @@ void DeleteText(void*, ZQExport* s) { delete s; }
 std::unique_ptr<Target> MakeTextTarget(OutputFormat format, const std::string& path, const WriteOptions& opts,
                                        std::string* error) {
   if (opts.mode != 0) {
-    *error = "append and update modes need a table as the target";
+    *error = "append and update modes need a table or a SQLite database as the target";
     return nullptr;
   }
-  return std::make_unique<Target>(TargetPtr(new ZQToText(format), TargetDeleter{DeleteText}), path);
+  return std::make_unique<Target>(TargetPtr(new ZQToText(format, opts.table_name), TargetDeleter{DeleteText}), path);
 }
 
 }  // namespace
@@ -86,4 +87,9 @@ std::unique_ptr<Target> MakeCsvTarget(const std::string& path, const WriteOption
 std::unique_ptr<Target> MakeJsonlTarget(const std::string& path, const WriteOptions& opts, ZQImport*,
                                         std::string* error) {
   return MakeTextTarget(OutputFormat::kJsonl, path, opts, error);
+}
+
+std::unique_ptr<Target> MakePgsqlTarget(const std::string& path, const WriteOptions& opts, ZQImport*,
+                                        std::string* error) {
+  return MakeTextTarget(OutputFormat::kPgsql, path, opts, error);
 }

@@ -13,7 +13,8 @@
 
 class ZQToText : public ZQExport {
  public:
-  explicit ZQToText(OutputFormat format);
+  // `table` names the table of a script (pgsql).
+  ZQToText(OutputFormat format, const std::string& table);
   ~ZQToText() override;
 
   bool SupportMode(SpokeMode mode) const override { return mode == kReplace; }
@@ -25,6 +26,7 @@ class ZQToText : public ZQExport {
 
  private:
   OutputFormat format_;
+  std::string table_;
   std::string final_path_, temp_path_;  // temp_path_ "": written in place
   int fd_ = -1;
   std::unique_ptr<OutBuf> out_;

@@ -1,5 +1,7 @@
 #include "engine/writers.h"
 
+#include "engine/text_util.h"
+
 #include "host/bytescan.h"
 
 #include <cstdio>
@@ -62,18 +64,18 @@ class CsvWriter : public RecordWriter {
  public:
   explicit CsvWriter(OutBuf& out) : out_(out) {}
   void Begin(const ZQRecord& layout) override {
-    for (int i = 0; i < layout.FieldCount(); ++i) {
-      if (i) out_.Put(',');
-      const char* name = layout[i]->Name();
+    RecordWriter::Columns(layout);
+    for (size_t k = 0; k < cols_.size(); ++k) {
+      if (k) out_.Put(',');
+      const char* name = layout[cols_[k]]->Name();
       PutCsvText(out_, name, strlen(name));
     }
     out_.Put("\r\n", 2);
   }
   void Row(ZQRecord& record) override {
-    int n = record.FieldCount();
-    for (int i = 0; i < n; ++i) {
-      if (i) out_.Put(',');
-      ZQField* f = record.GetFieldbyPos(i);
+    for (size_t k = 0; k < cols_.size(); ++k) {
+      if (k) out_.Put(',');
+      ZQField* f = record.GetFieldbyPos(cols_[k]);
       // Text, the usual case, is tested first: one predictable branch.
       if (f->held() == ZQField::Held::kText) {
         PutCsvString(out_, f->StringRef());
@@ -108,10 +110,11 @@ class JsonlWriter : public RecordWriter {
   explicit JsonlWriter(OutBuf& out) : out_(out) {}
   void Begin(const ZQRecord& layout) override {
     keys_.clear();
-    for (int i = 0; i < layout.FieldCount(); ++i) {
+    RecordWriter::Columns(layout);
+    for (size_t k = 0; k < cols_.size(); ++k) {
       std::string key;
-      const char* name = layout[i]->Name();
-      key += i ? ",\"" : "{\"";
+      const char* name = layout[cols_[k]]->Name();
+      key += k ? ",\"" : "{\"";
       for (const char* p = name; *p; ++p) {
         unsigned char c = static_cast<unsigned char>(*p);
         if (c == '"' || c == '\\') key += '\\';
@@ -128,11 +131,10 @@ class JsonlWriter : public RecordWriter {
     }
   }
   void Row(ZQRecord& record) override {
-    int n = record.FieldCount();
-    if (n == 0) out_.Put('{');
-    for (int i = 0; i < n; ++i) {
-      out_.Put(keys_[size_t(i)].data(), keys_[size_t(i)].size());
-      ZQField* f = record.GetFieldbyPos(i);
+    if (cols_.empty()) out_.Put('{');
+    for (size_t k = 0; k < cols_.size(); ++k) {
+      out_.Put(keys_[k].data(), keys_[k].size());
+      ZQField* f = record.GetFieldbyPos(cols_[k]);
       switch (f->held()) {
         case ZQField::Held::kBlank: out_.Put("null", 4); break;
         case ZQField::Held::kText: {
@@ -196,8 +198,9 @@ class TableWriter : public RecordWriter {
   explicit TableWriter(OutBuf& out) : out_(out) {}
   void Begin(const ZQRecord& layout) override {
     widths_.clear();
-    for (int i = 0; i < layout.FieldCount(); ++i) {
-      const ZQField* f = layout[i];
+    RecordWriter::Columns(layout);
+    for (int c : cols_) {
+      const ZQField* f = layout[c];
       size_t w;
       switch (f->FieldType()) {
         case FT_DATE: w = 10; break;
@@ -213,17 +216,17 @@ class TableWriter : public RecordWriter {
       if (w < name_len) w = name_len;
       widths_.push_back(w);
     }
-    for (int i = 0; i < layout.FieldCount(); ++i) Cell(i, layout[i]->Name(), strlen(layout[i]->Name()));
+    for (size_t k = 0; k < cols_.size(); ++k) Cell(k, layout[cols_[k]]->Name(), strlen(layout[cols_[k]]->Name()));
     out_.Put('\n');
-    for (int i = 0; i < layout.FieldCount(); ++i) {
-      if (i) out_.Put("  ", 2);
-      for (size_t k = 0; k < widths_[size_t(i)]; ++k) out_.Put('-');
+    for (size_t k = 0; k < cols_.size(); ++k) {
+      if (k) out_.Put("  ", 2);
+      for (size_t w = 0; w < widths_[k]; ++w) out_.Put('-');
     }
     out_.Put('\n');
   }
   void Row(ZQRecord& record) override {
-    for (int i = 0; i < record.FieldCount(); ++i) {
-      ZQField* f = record.GetFieldbyPos(i);
+    for (size_t i = 0; i < cols_.size(); ++i) {
+      ZQField* f = record.GetFieldbyPos(cols_[i]);
       ZQString text;
       switch (f->held()) {
         case ZQField::Held::kBlank: break;
@@ -275,8 +278,8 @@ class TableWriter : public RecordWriter {
     return k;
   }
 
-  void Cell(int i, const char* s, size_t n) {
-    size_t w = widths_[size_t(i)];
+  void Cell(size_t i, const char* s, size_t n) {
+    size_t w = widths_[i];
     if (i) out_.Put("  ", 2);
     size_t cols = Columns(s, n);
     if (cols > w) {
@@ -286,7 +289,7 @@ class TableWriter : public RecordWriter {
       return;
     }
     out_.Put(s, n);
-    if (size_t(i) + 1 < widths_.size())
+    if (i + 1 < widths_.size())
       for (size_t k = cols; k < w; ++k) out_.Put(' ');
   }
 
@@ -300,12 +303,14 @@ bool ParseFormat(const std::string& name, OutputFormat* out) {
   if (name == "csv") *out = OutputFormat::kCsv;
   else if (name == "jsonl" || name == "json") *out = OutputFormat::kJsonl;
   else if (name == "table") *out = OutputFormat::kTable;
+  else if (name == "pgsql") *out = OutputFormat::kPgsql;
   else return false;
   return true;
 }
 
-std::unique_ptr<RecordWriter> MakeWriter(OutputFormat format, OutBuf& out) {
+std::unique_ptr<RecordWriter> MakeWriter(OutputFormat format, OutBuf& out, const std::string& table) {
   switch (format) {
+    case OutputFormat::kPgsql: return MakePgsqlWriter(out, table);
     case OutputFormat::kJsonl: return std::make_unique<JsonlWriter>(out);
     case OutputFormat::kTable: return std::make_unique<TableWriter>(out);
     default: return std::make_unique<CsvWriter>(out);
@@ -313,46 +318,24 @@ std::unique_ptr<RecordWriter> MakeWriter(OutputFormat format, OutBuf& out) {
 }
 
 void PutJsonString(OutBuf& out, const char* s, size_t n) {
-  out.Put('"');
-  const auto* p = reinterpret_cast<const unsigned char*>(s);
-  size_t start = 0;
-  for (size_t i = 0; i < n;) {
-    unsigned char c = p[i];
-    if (c >= 0x20 && c != '"' && c != '\\' && c < 0x80) {
-      ++i;
-      continue;
-    }
-    if (c >= 0x80) {
-      int extra = c >= 0xF0 && c < 0xF5 ? 3 : c >= 0xE0 && c < 0xF0 ? 2 : c >= 0xC2 && c < 0xE0 ? 1 : 0;
-      bool ok = extra > 0 && i + size_t(extra) < n;
-      for (int k = 1; ok && k <= extra; ++k) ok = (p[i + size_t(k)] & 0xC0) == 0x80;
-      if (ok) {
-        i += size_t(extra) + 1;
-        continue;
-      }
-      out.Put(s + start, i - start);
-      char esc[8];
-      snprintf(esc, sizeof esc, "\\u%04x", c);  // not UTF-8: the byte as Latin-1
-      out.Put(esc, 6);
-      start = ++i;
-      continue;
-    }
-    out.Put(s + start, i - start);
+  auto escape = [](OutBuf& o, unsigned char c) {
     switch (c) {
-      case '"': out.Put("\\\"", 2); break;
-      case '\\': out.Put("\\\\", 2); break;
-      case '\n': out.Put("\\n", 2); break;
-      case '\r': out.Put("\\r", 2); break;
-      case '\t': out.Put("\\t", 2); break;
+      case '"': o.Put("\\\"", 2); break;
+      case '\\': o.Put("\\\\", 2); break;
+      case '\n': o.Put("\\n", 2); break;
+      case '\r': o.Put("\\r", 2); break;
+      case '\t': o.Put("\\t", 2); break;
       default: {
         char esc[8];
         snprintf(esc, sizeof esc, "\\u%04x", c);
-        out.Put(esc, 6);
+        o.Put(esc, 6);
       }
     }
-    start = ++i;
-  }
-  out.Put(s + start, n - start);
+  };
+  out.Put('"');
+  PutEscaped(
+      out, s, n, [](unsigned char c) { return c >= 0x20 && c != '"' && c != '\\'; }, escape,
+      [&](OutBuf& o, unsigned char c) { escape(o, c); });  // not UTF-8: the byte as Latin-1, \u00XX
   out.Put('"');
 }
 

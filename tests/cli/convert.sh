@@ -137,21 +137,21 @@ python3 -c "
 print(','.join('column_number_%d' % i for i in range(40)))
 print(','.join(str(i) for i in range(40)))" >wide.csv
 expect_run 0 convert wide.csv wide.dbf --to 0
-err_has "zqdb: warning: field column_number_0 is named COLUMN_NUM in the target"
+err_has "zqdb: warning: 32 field names were changed (column_number_0 -> COLUMN_NUM, column_number_1 -> COLUMN_N_2, column_number_2 -> COLUMN_N_3, ...)"
 err_has "zqdb: warning: field column_number_32 and those behind it are left out: the target keeps 32 fields"
 "$ZQDB" info wide.dbf >"$OUT" && expect_out "fields:      32"
 # Memos to a dialect without them, long text, blank logicals.
 long=$(printf 'z%.0s' {1..300})
 printf 'NAME,NOTE,OK\nann,short note,true\nbob,%s,\n' "$long" >notes.csv
 expect_run 0 convert notes.csv notes0.dbf --to 0 --schema "NOTE M, OK L"
-err_has "zqdb: warning: field NOTE: memo folded to text of 254 bytes: this dialect has no memo fields"
-err_has "zqdb: warning: field NOTE: 1 values longer than 254 bytes were cut"
-err_has "zqdb: warning: field OK: 1 blank logicals were written as F"
+err_has "zqdb: warning: 1 field type was changed (NOTE: memo folded to text of 254 bytes: this dialect has no memo fields)"
+err_has "zqdb: warning: 1 field had values cut to its width (NOTE: 1 longer than 254 bytes)"
+err_has "zqdb: warning: 1 logical field had blanks written as F (OK: 1)"
 printf 'NAME,NOTE\nann,%s\n' "${long:0:255}" >text255.csv
 expect_run 0 convert text255.csv notes3.dbf --to 3 --schema "NOTE C(255)"
-err_has "zqdb: warning: field NOTE: text cut to 254 bytes: this dialect has no memo fields"
+err_has "zqdb: warning: 1 field type was changed (NOTE: text cut to 254 bytes: this dialect has no memo fields)"
 expect_run 0 convert text255.csv notes4.dbf --to 4 --schema "NOTE C(255)"
-err_has "zqdb: warning: field NOTE: text longer than 254 bytes stored as a memo"
+err_has "zqdb: warning: 1 field type was changed (NOTE: text longer than 254 bytes stored as a memo)"
 "$ZQDB" cat notes4.dbf --format jsonl >"$OUT"
 expect_out "\"NOTE\":\"${long:0:255}\""
 expect_run 0 convert notes.csv notes2.dbf --to 2
@@ -169,7 +169,7 @@ expect_run 0 convert notes.csv nomemo.dbf --to 2 --memo always && "$ZQDB" cat no
   expect_out '{"NAME":"ann","NOTE":null,"OK":true}'
 # A table to a table of a dialect without memos.
 expect_run 0 convert notes2.dbf notes2to0.dbf --to 0
-err_has "zqdb: warning: field NOTE: memo folded to text of 254 bytes"
+err_has "zqdb: warning: 1 field type was changed (NOTE: memo folded to text of 254 bytes"
 
 # --- Append and update -------------------------------------------------------
 # A dBASE III table with alice (live) and bob (deleted).
@@ -195,7 +195,7 @@ X
 # Source fields the table lacks, and table fields the source lacks.
 printf 'NAME,COLOR\nerin,red\n' >other.csv
 expect_run 0 convert other.csv people.dbf --mode append
-err_has "zqdb: warning: field QTY of the table has no source field: left blank"
-err_has "zqdb: warning: field COLOR is left out: the table has no such field"
+err_has "zqdb: warning: 1 field of the table has no source field and is left blank (QTY)"
+err_has "zqdb: warning: 1 source field is left out: the table has no such field (COLOR)"
 
 finish

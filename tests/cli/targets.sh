@@ -54,7 +54,7 @@ same "a table to /dev/stdout on a pipe" "$(head -c 57 "$ERR")" "zqdb: /dev/stdou
 
 # Names of formats zqdb doesn't write.
 for name in out.tsv out.txt OUT.TXT; do
-  expect_run 2 convert t.dbf "$name" && expect_err "zqdb: zqdb writes tables, CSV and JSON-lines files, not $name"
+  expect_run 2 convert t.dbf "$name" && expect_err "zqdb: zqdb writes tables, CSV, JSON-lines, SQLite and PostgreSQL files, not $name"
   [ -e "$name" ] && fail "$name was made" || PASSED=$((PASSED + 1))
 done
 finish

@@ -72,6 +72,46 @@ TEST(CsvOutput, QuotesOnlyWhatNeedsIt) {
   EXPECT_EQ(got, "A,\"B,1\"\r\nx,\"say \"\"hi\"\", twice\nok\"\r\n," + std::string(40, 'z') + "\r\n");
 }
 
+// A PostgreSQL script on exact bytes: names lower-cased and quoted, types
+// by width, COPY's escapes, NULL as \N, bytes that are no UTF-8 as Latin-1,
+// NUL left out, a number that isn't one as NULL.
+TEST(PgsqlOutput, ScriptTypesAndEscapes) {
+  ZQDType text, num, money;
+  text.Define("Text;usage=0x43");
+  num.Define("dBASE Numeric;decsep=.;usage=0x4e");
+  ZQRecord r;
+  text.Length(20);
+  ZQField* a = r.NewField(text, "Say\"It");
+  num.Length(5);  // "-9999" to "99999": more than SMALLINT holds
+  ZQField* q = r.NewField(num, "QTY");
+  num.Length(12);
+  num.DecimalPlaces(2);
+  ZQField* m = r.NewField(num, "AMT");
+  std::string got = Captured([&](OutBuf& o) {
+    auto w = MakeWriter(OutputFormat::kPgsql, o, "Shop");
+    w->Begin(r);
+    static const char kSaid[] = "tab\there\nback\\slash\r\x01 caf\xe9 \xc3\xa9 nul\0!";
+    const std::string said(kSaid, sizeof kSaid - 1);
+    a->AssignText(said.data(), int32_t(said.size()));
+    q->AssignText("-42", 3);
+    m->AssignText("***", 3);
+    w->Row(r);
+    a->Blank();
+    q->Blank();
+    m->AssignText("12.50", 5);
+    w->Row(r);
+    w->End();
+  });
+  EXPECT_EQ(got,
+            "SET client_encoding = 'UTF8';\nSET standard_conforming_strings = on;\nBEGIN;\n"
+            "DROP TABLE IF EXISTS \"shop\";\n"
+            "CREATE TABLE \"shop\" (\"say\"\"it\" VARCHAR(20), \"qty\" INTEGER, \"amt\" NUMERIC(12,2));\n"
+            "COPY \"shop\" (\"say\"\"it\", \"qty\", \"amt\") FROM STDIN;\n"
+            "tab\\there\\nback\\\\slash\\r\\001 caf\xc3\xa9 \xc3\xa9 nul!\t-42\t\\N\n"
+            "\\N\t\\N\t12.50\n"
+            "\\.\nCOMMIT;\n");
+}
+
 TEST(CsvReading, QuotesLineBreaksAndDamage) {
   std::string path = tests::WriteTemp(
       "reader.csv", tests::Bytes{'a', ',', 'b', '\r', '\n', '"', 'x', ',', '"', '"', 'y', '"', ',', '\n',

@@ -1,0 +1,434 @@
+// SQLite databases as a target (one table, made anew or added to) and as a
+// source (the rows of one table), through Debian's libsqlite3.
+//
+// Column types from the field types: C and D (ISO date) and T (ISO
+// date-time) TEXT, M TEXT, binary memos BLOB, N and F without decimals
+// INTEGER, with decimals REAL when a double holds every value of the width
+// exactly (15 digits), else NUMERIC, L INTEGER 0/1, I INTEGER, Y NUMERIC,
+// B REAL. Blanks are NULL. All rows go in one transaction, so a failed run
+// leaves the database as it was.
+#include <sqlite3.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdio>
+#include <cstring>
+#include <string>
+#include <vector>
+
+#include "engine/endpoints.h"
+#include "engine/text_types.h"
+#include "engine/text_util.h"
+
+namespace {
+
+std::string QuoteIdent(const std::string& name) {
+  std::string out = "\"";
+  for (char c : name) {
+    if (c == '"') out += '"';
+    out += c;
+  }
+  return out + "\"";
+}
+
+// The column type of a field of the text types (their usage letters).
+const char* SqliteType(const ZQField* f) {
+  switch (char(f->DataType().Usage())) {
+    case 'N':
+    case 'F':
+      if (f->DecLen() == 0) return "INTEGER";
+      return f->Length() <= 15 ? "REAL" : "NUMERIC";
+    case 'L':
+    case 'I': return "INTEGER";
+    case 'Y': return "NUMERIC";
+    case 'B': return f->FieldType() == FT_FLOAT ? "REAL" : "BLOB";
+    case 'G': return "BLOB";
+    default: return "TEXT";
+  }
+}
+
+// The field type of an existing column, by SQLite's rules of affinity.
+const ZQDType& TypeOfColumn(const std::string& declared) {
+  const TextTypes& t = TextTypes::Get();
+  std::string d = Upper(declared);
+  if (d.find("INT") != std::string::npos) return t.integer;
+  if (d.find("CHAR") != std::string::npos || d.find("CLOB") != std::string::npos || d.find("TEXT") != std::string::npos)
+    return d.find("DATETIME") != std::string::npos || d.find("TIMESTAMP") != std::string::npos ? t.datetime : t.memo;
+  if (d.empty() || d.find("BLOB") != std::string::npos) return t.memo;
+  if (d == "DATE") return t.date;
+  if (d.find("BOOL") != std::string::npos) return t.boolean;
+  return t.dbl;  // REAL, FLOA, DOUB, NUMERIC, DECIMAL
+}
+
+// The columns of `table` in `db`, as fields of `out`. False when the table
+// doesn't exist.
+bool ColumnsOf(sqlite3* db, const std::string& table, ZQRecord* out) {
+  sqlite3_stmt* st = nullptr;
+  std::string sql = "PRAGMA table_info(" + QuoteIdent(table) + ")";
+  if (sqlite3_prepare_v2(db, sql.c_str(), -1, &st, nullptr) != SQLITE_OK) return false;
+  bool any = false;
+  while (sqlite3_step(st) == SQLITE_ROW) {
+    const char* name = reinterpret_cast<const char*>(sqlite3_column_text(st, 1));
+    const char* type = reinterpret_cast<const char*>(sqlite3_column_text(st, 2));
+    ZQDType t = TypeOfColumn(type ? type : "");
+    if (char(t.Usage()) == 'D') t.Length(8);
+    out->NewField(t, name ? name : "");
+    any = true;
+  }
+  sqlite3_finalize(st);
+  return any;
+}
+
+class ZQToSqlite : public ZQExport {
+ public:
+  explicit ZQToSqlite(const WriteOptions& opts) : ZQExport(ZQSpokeDef{}, nullptr, false), opts_(opts) {
+    ReplaceValidTypes(const_cast<const ZQDType**>(TextTypes::Get().list));
+  }
+  ~ZQToSqlite() override { _CloseOutput(false); }
+
+  bool SupportMode(SpokeMode mode) const override { return mode == kReplace || mode == kAppend; }
+  int MaxFieldCount() override { return 2000; }  // SQLite's default column limit
+  int FieldNameMaxLength() override { return 1024; }
+
+  BATCHERR MakeFields(ZQRecord& record, const ZQConnTarget& target) override {
+    sqlite3* db = nullptr;
+    bool ok = sqlite3_open_v2(target.path.c_str(), &db, SQLITE_OPEN_READONLY, nullptr) == SQLITE_OK &&
+              ColumnsOf(db, opts_.table_name, &record);
+    sqlite3_close(db);
+    if (!ok) return LogError(4, ZQ_OPEN_ERROR, "%s has no table %s", target.path.c_str(), opts_.table_name.c_str());
+    return 0;
+  }
+
+  BATCHERR _OpenOutput(const ZQConnTarget& target) override {
+    inserted_count_ = 0;
+    path_ = target.path.c_str();
+    struct stat st;
+    created_ = stat(path_.c_str(), &st) != 0;
+    if (sqlite3_open_v2(path_.c_str(), &db_, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, nullptr) != SQLITE_OK)
+      return Failed(ZQ_CREATE_ERROR, "cannot open");
+    // The journal keeps the database whole if the run fails or is killed.
+    if (!Exec("PRAGMA synchronous = OFF") || !Exec("BEGIN IMMEDIATE")) return Failed(ZQ_CREATE_ERROR, "cannot write");
+    ZQRecord& layout = *GetLayout(0);
+    std::string table = QuoteIdent(opts_.table_name), names, marks;
+    for (int i = 0; i < layout.FieldCount(); ++i) {
+      names += (i ? ", " : "") + QuoteIdent(layout[i]->Name());
+      marks += i ? ", ?" : "?";
+    }
+    if (GetMode() == kReplace) {
+      std::string create = "CREATE TABLE " + table + " (";
+      for (int i = 0; i < layout.FieldCount(); ++i)
+        create += (i ? ", " : "") + QuoteIdent(layout[i]->Name()) + " " + SqliteType(layout[i]);
+      if (!Exec("DROP TABLE IF EXISTS " + table) || !Exec(create + ")")) return Failed(ZQ_CREATE_ERROR, "cannot create the table");
+    }
+    std::string insert = "INSERT INTO " + table + " (" + names + ") VALUES (" + marks + ")";
+    if (sqlite3_prepare_v2(db_, insert.c_str(), -1, &insert_, nullptr) != SQLITE_OK)
+      return Failed(ZQ_CREATE_ERROR, "cannot add to the table");
+    target_.path = target.path;
+    return 0;
+  }
+
+  BATCHERR GenerateDetailRecord(int layout_no) override {
+    if (layout_no != 0) return ZQ_INDEX_ERROR;
+    if (insert_ == nullptr) return ZQ_NOT_OPEN;
+    ZQRecord& r = *GetLayout(0);
+    for (int i = 0; i < r.FieldCount(); ++i) Bind(i + 1, r.GetFieldbyPos(i));
+    int rc = sqlite3_step(insert_);
+    sqlite3_reset(insert_);
+    if (rc != SQLITE_DONE) return Failed(ZQ_WRITE_ERROR, "cannot write");
+    ++inserted_count_;
+    return 0;
+  }
+
+  BATCHERR _CloseOutput(bool keep) override {
+    if (db_ == nullptr) return 0;
+    sqlite3_finalize(insert_);
+    insert_ = nullptr;
+    bool ok = keep && Exec("COMMIT");
+    if (!ok) Exec("ROLLBACK");
+    sqlite3_close(db_);
+    db_ = nullptr;
+    if (!ok && created_) unlink(path_.c_str());  // a database this run made and didn't fill
+    if (keep && !ok) return LogError(4, ZQ_WRITE_ERROR, "cannot write %s", path_.c_str());
+    return 0;
+  }
+
+ private:
+  bool Exec(const std::string& sql) { return sqlite3_exec(db_, sql.c_str(), nullptr, nullptr, nullptr) == SQLITE_OK; }
+
+  BATCHERR Failed(BATCHERR code, const char* what) {
+    std::string message = std::string(what) + " " + path_ + ": " + (db_ ? sqlite3_errmsg(db_) : "out of memory");
+    return LogError(4, code, "%s", message.c_str());
+  }
+
+  void Bind(int at, ZQField* f) {
+    switch (f->held()) {
+      case ZQField::Held::kBlank: sqlite3_bind_null(insert_, at); break;
+      case ZQField::Held::kLong: sqlite3_bind_int64(insert_, at, f->LongVal()); break;
+      case ZQField::Held::kDouble: sqlite3_bind_double(insert_, at, f->DoubleVal()); break;
+      case ZQField::Held::kBool: sqlite3_bind_int(insert_, at, f->BoolVal() ? 1 : 0); break;
+      case ZQField::Held::kDate: {
+        const ZQDate& d = f->DateRef();
+        char buf[16];
+        snprintf(buf, sizeof buf, "%04d-%02d-%02d", int(d.Year()), int(d.Month()), int(d.Day()));
+        sqlite3_bind_text(insert_, at, buf, 10, SQLITE_TRANSIENT);
+        break;
+      }
+      case ZQField::Held::kDateTime: {
+        ZQString s;
+        f->DateTimeRef().PrintIso(s);
+        sqlite3_bind_text(insert_, at, s.c_str(), int(s.length()), SQLITE_TRANSIENT);
+        break;
+      }
+      case ZQField::Held::kText: {
+        // Numbers as the table's text: the column's affinity makes them
+        // INTEGER or REAL as they read, and keeps text that is no number.
+        const ZQString& s = f->StringRef();
+        if (f->FieldType() == FT_BINARY) sqlite3_bind_blob(insert_, at, s.c_str(), int(s.length()), SQLITE_STATIC);
+        else sqlite3_bind_text(insert_, at, s.c_str(), int(s.length()), SQLITE_STATIC);
+        break;
+      }
+    }
+  }
+
+  WriteOptions opts_;
+  std::string path_;
+  bool created_ = false;
+  sqlite3* db_ = nullptr;
+  sqlite3_stmt* insert_ = nullptr;
+};
+
+void DeleteSqlite(void*, ZQExport* s) { delete s; }
+
+class SqliteTarget : public Target {
+ public:
+  SqliteTarget(TargetPtr spoke, const std::string& path, bool existing)
+      : Target(std::move(spoke), path), existing_(existing) {}
+  bool AddsToExisting() const override { return existing_; }
+
+ private:
+  bool existing_;
+};
+
+}  // namespace
+
+std::unique_ptr<Target> MakeSqliteTarget(const std::string& path, const WriteOptions& opts, ZQImport*,
+                                         std::string* error) {
+  if (opts.mode == 2) return *error = "update mode needs a table as the target", nullptr;
+  ZQRecord probe;
+  bool existing = opts.mode == 1 && ReadSqliteLayout(path, opts, &probe);
+  if (opts.mode == 1 && !existing)
+    return *error = path + " has no table " + opts.table_name + " to append to", nullptr;
+  return std::make_unique<SqliteTarget>(TargetPtr(new ZQToSqlite(opts), TargetDeleter{DeleteSqlite}), path, existing);
+}
+
+bool ReadSqliteLayout(const std::string& path, const WriteOptions& opts, ZQRecord* out) {
+  if (access(path.c_str(), R_OK) != 0) return false;
+  sqlite3* db = nullptr;
+  bool ok = sqlite3_open_v2(path.c_str(), &db, SQLITE_OPEN_READONLY, nullptr) == SQLITE_OK &&
+            ColumnsOf(db, opts.table_name, out);
+  sqlite3_close(db);
+  return ok;
+}
+
+namespace {
+
+bool IsIsoDate(const unsigned char* p, int n) {
+  if (n != 10 || p[4] != '-' || p[7] != '-') return false;
+  for (int i : {0, 1, 2, 3, 5, 6, 8, 9})
+    if (p[i] < '0' || p[i] > '9') return false;
+  return true;
+}
+
+// What one pass over a column's values found.
+struct ColumnSeen {
+  bool ints = false, reals = false, text = false, blobs = false, dates = true, bools = true, exp = false;
+  int max_len = 0;     // bytes of the longest value as text
+  int int_digits = 0;  // of the numbers, sign included
+  int frac_digits = 0;
+};
+
+class ZQFromSqlite : public ZQImport {
+ public:
+  explicit ZQFromSqlite(const std::string& table) : ZQImport(ZQSpokeDef{}, nullptr, false), table_(table) {}
+  ~ZQFromSqlite() override { ConnectionClose(); }
+
+  BATCHERR MakeFields() override {
+    std::string path = target_.path.c_str();
+    if (access(path.c_str(), R_OK) != 0)
+      return LogError(4, ZQ_OPEN_ERROR, "cannot open %s: %s", path.c_str(), strerror(errno));
+    if (sqlite3_open_v2(path.c_str(), &db_, SQLITE_OPEN_READONLY, nullptr) != SQLITE_OK) return Failed("cannot open");
+    if (table_.empty() && !OnlyTable(&table_)) return ZQ_OPEN_ERROR;
+    ZQRecord declared;
+    if (!ColumnsOf(db_, table_, &declared)) {
+      std::string tables;
+      ListTables(&tables);
+      return LogError(4, ZQ_OPEN_ERROR, "%s has no table %s (its tables:%s)", path.c_str(), table_.c_str(),
+                      tables.c_str());
+    }
+    std::string sql = "SELECT * FROM " + QuoteIdent(table_);
+    if (sqlite3_prepare_v2(db_, sql.c_str(), -1, &select_, nullptr) != SQLITE_OK) return Failed("cannot read");
+    int n = sqlite3_column_count(select_);
+    std::vector<ColumnSeen> seen(static_cast<size_t>(n));
+    int rc;
+    while ((rc = sqlite3_step(select_)) == SQLITE_ROW)
+      for (int i = 0; i < n; ++i) See(i, &seen[size_t(i)]);
+    if (rc != SQLITE_DONE) return Failed("cannot read");
+    sqlite3_reset(select_);
+    ZQRecord* layout = GetLayout(0);
+    layout->ClearFields();
+    for (int i = 0; i < n; ++i) {
+      const char* type = sqlite3_column_decltype(select_, i);
+      ZQDType t = TypeFor(seen[size_t(i)], Upper(type ? type : ""));
+      if (layout->NewField(t, sqlite3_column_name(select_, i)) == nullptr) return ZQ_NO_MEMORY;
+    }
+    next_ = 0;
+    return 0;
+  }
+
+  BATCHERR GetRecord(int32_t n) override {
+    if (select_ == nullptr) return ZQ_NOT_OPEN;
+    if (n < next_) {
+      sqlite3_reset(select_);
+      next_ = 0;
+    }
+    int rc = SQLITE_ROW;
+    while (next_ <= n && (rc = sqlite3_step(select_)) == SQLITE_ROW) ++next_;
+    if (rc == SQLITE_DONE) {
+      GetLayout(0)->BlankFields();
+      return ZQ_END;
+    }
+    if (rc != SQLITE_ROW) return Failed("cannot read");
+    ZQRecord& r = *GetLayout(0);
+    for (int i = 0; i < r.FieldCount(); ++i) Assign(i, r.GetFieldbyPos(i));
+    return 0;
+  }
+
+  BATCHERR ConnectionClose() override {
+    sqlite3_finalize(select_);
+    select_ = nullptr;
+    sqlite3_close(db_);
+    db_ = nullptr;
+    return 0;
+  }
+
+ private:
+  BATCHERR Failed(const char* what) {
+    return LogError(4, ZQ_READ_ERROR, "%s %s: %s", what, target_.path.c_str(), db_ ? sqlite3_errmsg(db_) : "out of memory");
+  }
+
+  void ListTables(std::string* out) {
+    sqlite3_stmt* st = nullptr;
+    if (sqlite3_prepare_v2(db_, "SELECT name FROM sqlite_master WHERE type = 'table' ORDER BY name", -1, &st,
+                           nullptr) != SQLITE_OK)
+      return;
+    while (sqlite3_step(st) == SQLITE_ROW) *out += std::string(" ") + reinterpret_cast<const char*>(sqlite3_column_text(st, 0));
+    sqlite3_finalize(st);
+  }
+
+  // Without --table: the database's one table.
+  bool OnlyTable(std::string* out) {
+    std::string tables;
+    ListTables(&tables);
+    if (!tables.empty() && tables.find(' ', 1) == std::string::npos) {
+      *out = tables.substr(1);
+      return true;
+    }
+    LogError(4, ZQ_OPEN_ERROR, "%s holds %s: name one with --table", target_.path.c_str(),
+             tables.empty() ? "no table" : ("the tables" + tables).c_str());
+    return false;
+  }
+
+  void See(int i, ColumnSeen* s) {
+    int type = sqlite3_column_type(select_, i);
+    if (type == SQLITE_NULL) return;
+    const unsigned char* p = sqlite3_column_text(select_, i);
+    int n = sqlite3_column_bytes(select_, i);
+    if (n > s->max_len) s->max_len = n;
+    if (type == SQLITE_INTEGER) {
+      s->ints = true;
+      if (n > s->int_digits) s->int_digits = n;
+      int64_t v = sqlite3_column_int64(select_, i);
+      s->bools = s->bools && (v == 0 || v == 1);
+      s->dates = false;
+    } else if (type == SQLITE_FLOAT) {
+      s->reals = true;
+      s->bools = s->dates = false;
+      const char* dot = static_cast<const char*>(memchr(p, '.', size_t(n)));
+      if (memchr(p, 'e', size_t(n)) != nullptr || memchr(p, 'I', size_t(n)) != nullptr || memchr(p, 'N', size_t(n)) != nullptr) s->exp = true;
+      int whole = dot ? int(dot - reinterpret_cast<const char*>(p)) : n;
+      int frac = dot ? n - whole - 1 : 0;
+      if (whole > s->int_digits) s->int_digits = whole;
+      if (frac > s->frac_digits) s->frac_digits = frac;
+    } else {
+      (type == SQLITE_BLOB ? s->blobs : s->text) = true;
+      s->bools = false;
+      s->dates = s->dates && type == SQLITE_TEXT && IsIsoDate(p, n);
+    }
+  }
+
+  // The field type of a column: by the values it holds, the declared type
+  // telling logicals from integers.
+  static ZQDType TypeFor(const ColumnSeen& s, const std::string& declared) {
+    const TextTypes& t = TextTypes::Get();
+    ZQDType out = t.text;
+    if (s.blobs || (s.text && (s.ints || s.reals))) {
+      out = s.max_len > 254 || s.blobs ? t.memo : t.text;
+    } else if (s.text) {
+      if (s.dates) return t.date;  // as a CSV column of ISO dates is
+      out = s.max_len > 254 ? t.memo : t.text;
+    } else if (s.ints && !s.reals) {
+      if (s.bools && declared.find("BOOL") != std::string::npos) return t.boolean;
+      out = t.numeric;
+      out.Length(s.int_digits);
+      out.DecimalPlaces(0);
+      return s.int_digits <= 20 ? out : t.dbl;
+    } else if (s.reals) {
+      int w = s.int_digits + 1 + s.frac_digits;
+      if (s.exp || w > 20 || s.frac_digits > 15) return t.dbl;
+      out = t.numeric;
+      out.Length(w);
+      out.DecimalPlaces(int16_t(s.frac_digits));
+      return out;
+    }
+    if (char(out.Usage()) == 'C') out.Length(s.max_len > 0 ? s.max_len : 1);
+    return out;
+  }
+
+  void Assign(int i, ZQField* f) {
+    int type = sqlite3_column_type(select_, i);
+    if (type == SQLITE_NULL) {
+      f->Blank();
+      return;
+    }
+    switch (char(f->DataType().Usage())) {
+      case 'L': f->SetBool(sqlite3_column_int64(select_, i) != 0); return;
+      case 'B': *f = sqlite3_column_double(select_, i); return;
+      default: break;
+    }
+    const void* p = type == SQLITE_BLOB ? sqlite3_column_blob(select_, i) : sqlite3_column_text(select_, i);
+    f->AssignText(static_cast<const char*>(p), int32_t(sqlite3_column_bytes(select_, i)));
+  }
+
+  std::string table_;
+  sqlite3* db_ = nullptr;
+  sqlite3_stmt* select_ = nullptr;
+  int32_t next_ = 0;
+};
+
+void DeleteSqliteSource(void*, ZQImport* s) { delete s; }
+
+}  // namespace
+
+bool OpenSqliteSource(const std::string& path, const ReadOptions& opts, SourcePtr* out, std::string* error) {
+  SourcePtr source(new ZQFromSqlite(opts.table_name), SourceDeleter{DeleteSqliteSource});
+  ZQConnTarget t;
+  t.path = path.c_str();
+  source->SetUserInfo(t);
+  if (source->MakeFields() != 0) {
+    *error = source->LastErrorMessage();
+    return false;
+  }
+  *out = std::move(source);
+  return true;
+}

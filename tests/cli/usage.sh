@@ -1,0 +1,108 @@
+# Help and version, unknown options, errors with their reasons, gathered
+# warnings with --quiet and --strict, info --format json, --fields.
+source "$(dirname "$0")/lib.bash" "$1"
+cd "$WORK" || exit 1
+make_table t.dbf
+
+# --- Help and version ---------------------------------------------------------
+starts() {  # starts TEXT: the last run's stdout begins with TEXT
+  if [ "$(head -c ${#1} "$OUT")" = "$1" ]; then PASSED=$((PASSED + 1)); else fail "stdout starts: $(head -c 200 "$OUT")"; fi
+}
+expect_run 0 --version && starts "zqdb 0.1.0" && expect_out "connector definitions"
+expect_run 0 help && starts "usage: zqdb COMMAND [options] FILE..." && expect_out "  convert SRC DST"
+for cmd in info cat convert keys formats; do
+  expect_run 0 help $cmd && starts "usage: zqdb $cmd" && expect_out "examples:"
+  expect_run 0 $cmd --help && starts "usage: zqdb $cmd"
+done
+expect_run 2 help nosuch
+# Options a command doesn't take, and values it doesn't take.
+expect_run 2 info t.dbf --format jsonl && expect_err "zqdb: info --format takes text or json, not jsonl"
+expect_run 2 info t.dbf --mode append && expect_err "zqdb: info takes no option --mode"
+expect_run 2 convert t.dbf x.csv --to foxpro && expect_err "zqdb: --to goes with a table target, not csv"
+expect_run 2 convert t.dbf x.dbf --format nosuch && expect_err "zqdb: convert --format takes"
+[ ! -e x.csv ] && [ ! -e x.dbf ] && PASSED=$((PASSED + 1)) || fail "a usage error left a file"
+
+# --- Errors say why -----------------------------------------------------------
+: >empty.dbf
+{ printf 'PK\003\004'; head -c 60 /dev/zero; } >zip.dbf
+head -c 40 t.dbf >short.dbf
+mkdir dir.dbf
+cp t.dbf locked.dbf && chmod 000 locked.dbf
+while IFS='|' read -r file why; do
+  expect_run 1 info "$file" && expect_err "zqdb: Error opening data file $file: $why"
+done <<'X'
+missing.dbf|No such file or directory
+dir.dbf|is a directory
+empty.dbf|empty file
+zip.dbf|not a table (version byte 0x50)
+short.dbf|cut short: the header says 97 bytes, the file has 40
+X
+if [ "$(id -u)" != 0 ]; then
+  expect_run 1 cat locked.dbf && expect_err "locked.dbf: Permission denied"
+fi
+# info on a damaged table prints what its header says, then the error.
+expect_run 1 info short.dbf && expect_out "records:     2 in the header" && expect_err "cut short"
+# A memo error names the memo file.
+printf '\x83\x7c\x01\x01\x01\x00\x00\x00\x41\x00\x0b\x00' >memo.dbf
+printf '\x00%.0s' {1..20} >>memo.dbf
+printf 'NOTE\x00\x00\x00\x00\x00\x00\x00M\x00\x00\x00\x00\x0a\x00' >>memo.dbf
+printf '\x00%.0s' {1..14} >>memo.dbf
+printf '\x0d          1\x1a' >>memo.dbf
+expect_run 1 cat memo.dbf && expect_err "(memo.dbt: No such file or directory)"
+
+# --- Warnings: one line a kind, --quiet, --strict -----------------------------
+printf 'id,name,qty\n1,ann,2\n' >lower.csv
+expect_run 0 convert lower.csv up.dbf
+expect_err "zqdb: warning: 3 field names were upper-cased (id -> ID, name -> NAME, qty -> QTY)"
+[ "$(wc -l <"$ERR")" -eq 1 ] && PASSED=$((PASSED + 1)) || fail "more than one warning line: $(cat "$ERR")"
+expect_run 0 convert lower.csv up2.dbf --quiet
+[ ! -s "$ERR" ] && PASSED=$((PASSED + 1)) || fail "--quiet warned: $(cat "$ERR")"
+expect_run 1 convert lower.csv up3.dbf --strict && expect_err "zqdb: error (--strict): 3 field names were upper-cased"
+[ ! -e up3.dbf ] && PASSED=$((PASSED + 1)) || fail "--strict kept up3.dbf"
+# A value cut on the way stops the run at its record under --strict.
+printf 'NAME\nalice\nbernadette-marie\n' >long.csv
+expect_run 1 convert long.csv cut.dbf --schema "NAME C(5)" --strict
+expect_err "zqdb: record 2, field NAME: \"bernadette-marie\" would be cut to 5 bytes (--strict)"
+[ ! -e cut.dbf ] && PASSED=$((PASSED + 1)) || fail "--strict kept cut.dbf"
+
+# --- info --format json -------------------------------------------------------
+expect_run 0 info t.dbf --format json
+/usr/bin/python3 - "$OUT" <<'X' || fail "info json"
+import json, sys
+d = json.load(open(sys.argv[1]))
+want = {"dialect": 2, "dialect_name": "dBASE IV", "version_byte": 3, "codepage_byte": 0, "production_index": False,
+        "records_in_header": 2, "records_live": 1, "header_length": 97, "record_length": 16, "memo": None,
+        "fields": [{"name": "NAME", "type": "C", "width": 10, "decimals": 0},
+                   {"name": "QTY", "type": "N", "width": 5, "decimals": 0}], "indexes": []}
+bad = {k: (d.get(k), v) for k, v in want.items() if d.get(k) != v}
+sys.exit("differs: %r" % bad if bad else 0)
+X
+expect_run 0 convert t.dbf ix.dbf --index BYNAME=NAME --to 2
+expect_run 0 info ix.dbf --format json
+/usr/bin/python3 -c "
+import json, sys
+d = json.load(open('$OUT'))
+i = d['indexes'][0]
+assert (i['name'], i['expression'], i['unique']) == ('BYNAME', 'NAME', False), i
+assert i['file'].lower().endswith('ix.mdx') and d['production_index'] is True, d" || fail "info json indexes"
+printf 'NAME,NOTE\nann,hello\n' >notes.csv
+expect_run 0 convert notes.csv memo4.dbf --schema "NOTE M" && expect_run 0 info memo4.dbf --format json
+/usr/bin/python3 -c "
+import json
+m = json.load(open('$OUT'))['memo']
+assert m['file'].endswith('memo4.dbt') and m['kind'] == 'dBASE IV' and m['block_size'] == 512, m" || fail "info json memo"
+expect_run 1 info short.dbf --format json
+/usr/bin/python3 -c "
+import json
+d = json.load(open('$OUT'))
+assert d['records_in_header'] == 2 and 'cut short' in d['error'], d" || fail "info json of a damaged table"
+
+# --- --fields -----------------------------------------------------------------
+expect_run 0 cat t.dbf --fields qty,NAME && expect_out "QTY,NAME" && expect_out "42,alice"
+expect_run 0 convert t.dbf f.jsonl --fields QTY
+[ "$(cat f.jsonl)" = '{"QTY":42}' ] && PASSED=$((PASSED + 1)) || fail "convert --fields: $(cat f.jsonl)"
+expect_run 2 cat t.dbf --fields NAME,COLOR && expect_err "zqdb: --fields: no field COLOR; the fields are NAME, QTY"
+expect_run 2 convert t.dbf g.csv --fields COLOR && expect_err "zqdb: --fields: no field COLOR"
+[ ! -e g.csv ] && PASSED=$((PASSED + 1)) || fail "--fields error left g.csv"
+
+finish

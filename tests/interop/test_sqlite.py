@@ -1,0 +1,62 @@
+"""Tables of every dialect, with memos, converted to SQLite and read back
+with Debian's sqlite3: every value equals what zqdb cat --format jsonl
+gives. Then append mode, and the database as a source of a new table."""
+
+import json
+import os
+import sys
+
+sys.path.insert(0, os.path.dirname(os.path.abspath(__file__)))
+from common import ZQDB, Suite, run, workdir  # noqa: E402
+from databases import DIALECTS, compare, make_corpus  # noqa: E402
+
+os.environ["ZQDB_PATH"] = ZQDB
+s = Suite("sqlite")
+
+
+def sqlite_rows(db, table):
+    rc, out, err = run(["sqlite3", "-json", db, 'SELECT * FROM "%s" ORDER BY rowid' % table])
+    if rc != 0:
+        raise AssertionError("sqlite3: %s" % err.strip())
+    return json.loads(out) if out.strip() else []
+
+
+def sqlite_types(db, table):
+    rc, out, _ = run(["sqlite3", db, 'SELECT name, type FROM pragma_table_info("%s")' % table])
+    return dict(line.split("|") for line in out.splitlines())
+
+
+with workdir() as d:
+    tables = make_corpus(d)
+    for v in DIALECTS:
+        with s.case("dialect %d" % v):
+            db = os.path.join(d, "corpus%d.sqlite" % v)
+            rc, _, err = run([ZQDB, "convert", tables[v], db, "--no-progress"])
+            s.check("dialect %d convert" % v, rc == 0, err.strip())
+            compare(s, "dialect %d" % v, tables[v], sqlite_rows(db, "corpus%d" % v))
+    with s.case("column types"):
+        types = sqlite_types(os.path.join(d, "corpus2.sqlite"), "corpus2")
+        want = {"NAME": "TEXT", "AMOUNT": "REAL", "QTY": "INTEGER", "BORN": "TEXT", "OK": "INTEGER", "NOTE": "TEXT"}
+        s.check("column types", types == want, repr(types))
+    with s.case("append and --table"):
+        db = os.path.join(d, "shop.sqlite")
+        for mode in ("replace", "append"):
+            rc, _, err = run([ZQDB, "convert", tables[2], db, "--table", "people", "--mode", mode, "--no-progress"])
+            s.check("convert --mode " + mode, rc == 0, err.strip())
+        rows = sqlite_rows(db, "people")
+        s.check("append doubles the rows", len(rows) == 8, "%d rows" % len(rows))
+    with s.case("SQLite as a source"):
+        back = os.path.join(d, "back.dbf")
+        rc, _, err = run([ZQDB, "convert", os.path.join(d, "shop.sqlite"), back, "--table", "people", "--no-progress"])
+        s.check("convert from SQLite", rc == 0, err.strip())
+        compare(s, "SQLite source", back, sqlite_rows(os.path.join(d, "shop.sqlite"), "people"))
+    with s.case("a failed append leaves the database as it was"):
+        bad = os.path.join(d, "bad.csv")
+        with open(bad, "w") as f:
+            f.write("NAME,QTY\nx,1\ny,not a number\n")
+        rc, _, _ = run([ZQDB, "convert", bad, os.path.join(d, "shop.sqlite"), "--table", "people", "--mode", "append",
+                        "--schema", "QTY N(6,0)", "--no-progress"])
+        rows = sqlite_rows(os.path.join(d, "shop.sqlite"), "people")
+        s.check("failed append rolled back", rc == 1 and len(rows) == 8, "exit %d, %d rows" % (rc, len(rows)))
+
+s.done()

@@ -236,6 +236,17 @@ bool ZQToDbase::LayoutsMatch() {
   return true;
 }
 
+BATCHERR ZQToDbase::FieldsFitRecord() {
+  const ZQDBFILE* t = dbase.Table;
+  int32_t end = 0;
+  for (int i = 0; i < t->fieldcount; ++i) {
+    end += dbase.FieldList[i]->length;
+    if (end > int32_t(t->reclen) - 1)
+      return LogError(4, ZQ_READ_ERROR, lgettext(u"Field %d extends beyond end of record"), i);
+  }
+  return 0;
+}
+
 BATCHERR ZQToDbase::_OpenOutput(const ZQConnTarget& target) {
   inserted_count_ = 0;
   if (mode_ == kUpdate) deleted_count_ = updated_count_ = 0;
@@ -250,6 +261,13 @@ BATCHERR ZQToDbase::_OpenOutput(const ZQConnTarget& target) {
     return rc;
   }
   if (BATCHERR rc = dbase.DBOpenFile(path, true); rc != 0) {
+    dbase.CloseFile(nullptr);
+    return rc;
+  }
+  // A damaged header (a record length of 0, fields that run past the
+  // record) is refused as the read side refuses it, before any byte is
+  // encoded: the record buffer is sized by that length.
+  if (BATCHERR rc = FieldsFitRecord(); rc != 0) {
     dbase.CloseFile(nullptr);
     return rc;
   }

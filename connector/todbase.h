@@ -57,6 +57,8 @@ class ZQ_EXPORT ZQToDbase : public ZQExport {
  private:
   BATCHERR DBCreateFile(const char* path, ZQIndexDef* const* indexes);
   bool LayoutsMatch();
+  // 0, or an error when the table's fields run past its record length.
+  BATCHERR FieldsFitRecord();
   char DTypeToDbase(ZQDType type);
   BATCHERR FormatDBMemo(char* dest, ZQField* field);
   BATCHERR FormatClipperMemo(char* dest, ZQField* field);

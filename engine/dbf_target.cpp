@@ -4,7 +4,9 @@
 #include <unistd.h>
 
 #include <cctype>
+#include <cerrno>
 #include <cstdio>
+#include <cstring>
 #include <cstdlib>
 #include <string>
 #include <vector>
@@ -36,6 +38,7 @@ class TableTarget : public Target {
   int TextCodePage() const override { return opts_.table.codepage; }
 
   bool Open(std::string* error) override {
+    RemoveDeadStaging(path_);
     if (existing_) before_ = CountRecords();
     if (!AddIndexDefinitions(spoke_.get(), opts_.table, existing_, error)) return false;
     for (const IndexOption& o : opts_.table.indexes)
@@ -48,8 +51,10 @@ class TableTarget : public Target {
   bool Finish(int64_t added, std::string* error) override {
     ZQString v;
     spoke_->GetOption("version", v);
-    if (!VerifyTable(work_, connector_, v.c_str(), opts_.table, before_ + added, error)) return false;
+    int64_t end = -1;
+    if (!VerifyTable(work_, connector_, v.c_str(), opts_.table, before_ + added, error, &end)) return false;
     if (opts_.mode != 0) {
+      if (!TrimToEndMark(work_, end)) return *error = "cannot cut " + path_ + " at its end mark: " + strerror(errno), false;
       // A table added to gets a .cpg file when it has none, like a new one.
       if (opts_.table.codepage != 0 && !HasSibling(path_, "cpg") && !WriteCpg(path_, opts_.table.codepage, error))
         return false;

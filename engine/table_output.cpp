@@ -1,6 +1,8 @@
 #include "engine/table_output.h"
 
 #include <dirent.h>
+#include <signal.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -8,8 +10,43 @@
 #include <cstdlib>
 #include <cstring>
 
+namespace {
+
+// The number of a "name: value" line of a spoke's facts, or -1.
+int64_t FactNumber(const ZQString& facts, const char* name) {
+  std::string all(facts.c_str(), size_t(facts.length()));
+  std::string key = std::string(name) + ": ";
+  for (size_t at = 0; at < all.size();) {
+    if (all.compare(at, key.size(), key) == 0) return strtoll(all.c_str() + at + key.size(), nullptr, 10);
+    size_t nl = all.find('\n', at);
+    if (nl == std::string::npos) break;
+    at = nl + 1;
+  }
+  return -1;
+}
+
+// The owner's process id of a scratch entry named ".zqdb-PID-...", or 0.
+pid_t StagingOwner(const char* name) {
+  if (strncmp(name, kStagingPrefix, strlen(kStagingPrefix)) != 0) return 0;
+  char* end = nullptr;
+  long pid = strtol(name + strlen(kStagingPrefix), &end, 10);
+  return pid > 0 && *end == '-' ? pid_t(pid) : 0;
+}
+
+// Removes a scratch directory and the files in it (it holds no directories).
+void RemoveScratch(const std::string& dir) {
+  if (DIR* d = opendir(dir.c_str())) {
+    while (struct dirent* e = readdir(d))
+      if (strcmp(e->d_name, ".") != 0 && strcmp(e->d_name, "..") != 0) unlink((dir + "/" + e->d_name).c_str());
+    closedir(d);
+  }
+  rmdir(dir.c_str());
+}
+
+}  // namespace
+
 bool VerifyTable(const std::string& path, const TableConnector& c, const std::string& dialect,
-                 const TableWriteOptions& opts, int64_t expected, std::string* message) {
+                 const TableWriteOptions& opts, int64_t expected, std::string* message, int64_t* end_mark) {
   SourcePtr check = NewTableSource(c);
   if (!check) return *message = "out of memory", false;
   ApplyDialect(check.get(), dialect);
@@ -20,6 +57,15 @@ bool VerifyTable(const std::string& path, const TableConnector& c, const std::st
   BATCHERR rc = check->SetUserInfo(t);
   if (rc == 0) rc = check->MakeFields();
   int64_t count = rc == 0 ? check->EstimateRecordCount() : -1;
+  // Where the end mark stands: header length plus count times record length.
+  int64_t end = -1;
+  if (rc == 0) {
+    ZQString facts;
+    check->ReportFacts(facts);
+    int64_t header = FactNumber(facts, "header"), record = FactNumber(facts, "record");
+    if (header >= 0 && record >= 0 && count >= 0) end = header + count * record;
+  }
+  if (end_mark != nullptr) *end_mark = end;
   // The last record by number, which is the last one written unless the
   // table holds deleted records (then there are fewer live ones: 1 is fine).
   if (rc == 0 && count == expected && expected > 0) {
@@ -33,11 +79,39 @@ bool VerifyTable(const std::string& path, const TableConnector& c, const std::st
   return false;
 }
 
+void RemoveDeadStaging(const std::string& dst) {
+  size_t slash = dst.rfind('/');
+  std::string dir = slash == std::string::npos ? "." : dst.substr(0, slash == 0 ? 1 : slash);
+  DIR* d = opendir(dir.c_str());
+  if (d == nullptr) return;
+  std::vector<std::string> dead;
+  while (struct dirent* e = readdir(d)) {
+    pid_t owner = StagingOwner(e->d_name);
+    // ESRCH: no such process. A process of another user (EPERM) is alive.
+    if (owner != 0 && owner != getpid() && kill(owner, 0) != 0 && errno == ESRCH) dead.push_back(e->d_name);
+  }
+  closedir(d);
+  for (const std::string& name : dead) {
+    struct stat st;
+    std::string full = dir + "/" + name;
+    if (lstat(full.c_str(), &st) == 0 && S_ISDIR(st.st_mode)) RemoveScratch(full);
+  }
+}
+
+bool TrimToEndMark(const std::string& path, int64_t end) {
+  struct stat st;
+  if (end < 0 || stat(path.c_str(), &st) != 0 || !S_ISREG(st.st_mode) || st.st_size <= end + 1) return true;
+  FILE* f = fopen(path.c_str(), "rb");
+  int mark = f != nullptr && fseek(f, long(end), SEEK_SET) == 0 ? fgetc(f) : EOF;
+  if (f != nullptr) fclose(f);
+  return mark != 0x1A || truncate(path.c_str(), off_t(end + 1)) == 0;
+}
+
 bool Staging::Begin(const std::string& dst, std::string* work, std::string* error) {
   size_t slash = dst.rfind('/');
   dir_ = slash == std::string::npos ? "." : dst.substr(0, slash == 0 ? 1 : slash);
   std::string base = slash == std::string::npos ? dst : dst.substr(slash + 1);
-  std::string tmpl = dir_ + "/.zqdb-XXXXXX";
+  std::string tmpl = dir_ + "/" + kStagingPrefix + std::to_string(getpid()) + "-XXXXXX";
   std::vector<char> buf(tmpl.begin(), tmpl.end());
   buf.push_back('\0');
   if (mkdtemp(buf.data()) == nullptr) {
@@ -62,8 +136,7 @@ bool Staging::Commit(std::string* error) {
 
 void Staging::Discard() {
   if (staging_.empty()) return;
-  for (const std::string& name : Entries()) unlink((staging_ + "/" + name).c_str());
-  rmdir(staging_.c_str());
+  RemoveScratch(staging_);
   staging_.clear();
 }
 

@@ -12,8 +12,26 @@
 // and that the last of them reads: a write that failed only when the last
 // buffered bytes reached the disk (a full disk, a file size limit) shows
 // here, since closing a table reports nothing.
+// `end_mark`, when given, gets the offset the end mark stands at (-1 when
+// the table didn't open).
 bool VerifyTable(const std::string& path, const TableConnector& c, const std::string& dialect,
-                 const TableWriteOptions& opts, int64_t expected, std::string* message);
+                 const TableWriteOptions& opts, int64_t expected, std::string* message,
+                 int64_t* end_mark = nullptr);
+
+// A table that records were added to ends at its end mark: bytes behind it
+// (the records of a run that was killed before it wrote the header's count)
+// would be read as records by programs that go by the file's length, and
+// would outlive every later append. Cuts the file behind the 0x1A at `end`;
+// a file without the mark there is left as it is. False when the cut failed.
+bool TrimToEndMark(const std::string& path, int64_t end);
+
+// Scratch directories and files are named ".zqdb-PID-...", PID the process
+// that made them.
+constexpr char kStagingPrefix[] = ".zqdb-";
+
+// Removes the scratch directories beside `dst` whose process is gone (a
+// killed run leaves its own behind).
+void RemoveDeadStaging(const std::string& dst);
 
 // A replaced table is built in a scratch directory beside the target and
 // moved into place when it is whole, so that a failed run leaves the old

@@ -38,4 +38,44 @@ for t in t0 short; do
   done
 done
 
+# --- Killed runs ---------------------------------------------------------------
+# kill_when CONDITION ARGS...: runs zqdb ARGS in the background and kills it
+# with SIGKILL as soon as the shell test CONDITION holds.
+kill_when() {
+  local cond=$1; shift
+  "$ZQDB" "$@" --no-progress >/dev/null 2>&1 &
+  local pid=$!
+  until eval "$cond" || ! kill -0 $pid 2>/dev/null; do :; done
+  kill -9 $pid 2>/dev/null
+  { wait $pid; } 2>/dev/null
+  if [ $? -eq 137 ]; then PASSED=$((PASSED + 1)); else fail "zqdb $* ended before it was killed"; fi
+}
+size() { stat -c %s "$1" 2>/dev/null || echo 0; }
+seq 0 999999 | awk 'BEGIN { print "NAME,QTY" } { print "n" $1 "," $1 % 99999 }' >big.csv
+printf 'NAME,QTY\nann,1\nbob,2\n' >two.csv
+SCHEMA="NAME C(10), QTY N(5)"
+expect_run 0 convert big.csv big.dbf --schema "$SCHEMA" --no-progress
+expect_run 0 convert two.csv base.dbf --schema "$SCHEMA"
+# What an append of two.csv to base.dbf makes when nothing interrupts it.
+cp base.dbf clean.dbf && expect_run 0 convert two.csv clean.dbf --mode append
+# Killed early, and half-way through 16 MB: the header still counts 2
+# records; the next append writes from there and the table ends at its end
+# mark, byte for byte what an uninterrupted append makes.
+for at in 200 8000000; do
+  cp base.dbf t.dbf
+  kill_when "[ \$(size t.dbf) -gt $at ]" convert big.dbf t.dbf --mode append
+  expect_run 0 convert two.csv t.dbf --mode append
+  same t.dbf clean.dbf
+done
+# A killed replace leaves the old table as it was and its scratch directory,
+# named by its process id; the next run into that directory removes it.
+for at in 0 8000000; do
+  cp base.dbf r.dbf
+  kill_when "[ \$(size .zqdb-*/r.dbf) -gt $at ]" convert big.dbf r.dbf
+  same r.dbf base.dbf
+  ls -d .zqdb-[0-9]*-* >/dev/null 2>&1 && PASSED=$((PASSED + 1)) || fail "no scratch directory of the killed run"
+  expect_run 0 convert two.csv other.dbf
+  absent .zqdb-*
+done
+
 finish

@@ -19,6 +19,7 @@
 #include "engine/read_fix.h"
 #include "engine/report.h"
 #include "engine/target_path.h"
+#include "engine/table_lock.h"
 #include "engine/writers.h"
 #include "engine/field_plan.h"
 #include "engine/text_util.h"
@@ -61,6 +62,7 @@ const OptionHelp kOptionHelp[] = {
     {"index-form", "  --index-form plain       IDX files without compact keys (default compact)\n"},
     {"seek", "  --seek KEY               start at the first key not less than KEY\n"},
     {"reverse", "  --reverse                walk backwards (NDX, IDX, CDX)\n"},
+    {"wait", "  --wait                   wait for a table another program is writing (or reading, to write it)\n"},
     {"no-progress", "  --no-progress            no progress line on a terminal\n"},
     {"quiet", "  --quiet                  no warnings\n"},
     {"strict", "  --strict                 every warning is an error, and text the target's code page can't hold\n"},
@@ -192,6 +194,8 @@ int ParseArgs(int argc, char** argv, Args* args) {
       args->keys.has_seek = true;
     } else if (a == "--reverse") {
       args->keys.reverse = true;
+    } else if (a == "--wait") {
+      args->convert.wait = true;
     } else if (a == "--no-progress") {
       args->convert.progress = false;
     } else if (a == "--quiet") {
@@ -221,6 +225,11 @@ int ParseArgs(int argc, char** argv, Args* args) {
 // Opens the one table of `info` and `keys`.
 int OpenOrFail(const Args& args, SourcePtr* spoke, CodePageChoice* chosen = nullptr) {
   std::string error;
+  // Shared: readers never wait for each other, only for a writer. Held until
+  // the command ends.
+  static TableLocks lock;
+  lock.Add(args.files[0], false);
+  if (!lock.Take(args.convert.wait, &error)) return Fail(error);
   if (OpenSource(args.files[0], args.source, spoke, &error, chosen) != 0) return Fail(error);
   return 0;
 }
@@ -583,7 +592,7 @@ struct Command {
 };
 
 // The options of every command that opens a table.
-#define ZQ_TABLE_OPTIONS "dialect type modules codepage memo quiet strict "
+#define ZQ_TABLE_OPTIONS "dialect type modules codepage memo quiet strict wait "
 
 const Command kCommands[] = {
     {"info", "info TABLE", "dialect, version byte, record counts, memo file, fields and indexes", CmdInfo, true,

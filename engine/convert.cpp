@@ -8,9 +8,11 @@
 #include <string>
 
 #include "engine/dbf_source.h"
+#include "engine/aliases.h"
 #include "engine/field_plan.h"
 #include "engine/report.h"
 #include "engine/target_path.h"
+#include "engine/table_lock.h"
 #include "engine/transfer.h"
 
 int RunConvert(const std::string& src, const std::string& named, const ConvertOptions& opts) {
@@ -20,11 +22,21 @@ int RunConvert(const std::string& src, const std::string& named, const ConvertOp
   std::string dst, error;
   if (!ResolveTargetPath(named, strcmp(to.name, "dbf") == 0, &dst, &error)) return Fail(error);
   const Endpoint& from = SourceEndpoint(src);
+  bool table_source = strcmp(from.name, "dbf") == 0, table_target = strcmp(to.name, "dbf") == 0;
+  std::vector<std::string> index_files;  // --index NAME=EXPR with a file name
+  for (const IndexOption& o : opts.write.table.indexes)
+    if (o.name.find('.') != std::string::npos) index_files.push_back(o.name);
+  if (!CheckNoAlias(src, table_source, dst, table_target, index_files, &error)) return Fail(error);
+  // The tables are locked for the whole run, before anything of them is
+  // read: the target exclusively, a table source shared.
+  TableLocks locks;
+  if (table_source) locks.Add(src, false);
+  if (table_target) locks.Add(dst, true);
+  if (!locks.Take(opts.wait, &error)) return Fail(error);
   ReadOptions read = opts.read;
   WriteOptions write = opts.write;
   // A table's code page is chosen once, here: a new table written from it
   // keeps it unless --to-codepage says otherwise.
-  bool table_source = strcmp(from.name, "dbf") == 0;
   if (table_source) read.table.codepage = ChooseCodePage(src, read.table.codepage).codepage;
   if (write.table.codepage == kCodePageUnset && (write.mode == 0 || access(dst.c_str(), F_OK) != 0))
     write.table.codepage = table_source ? read.table.codepage : 0;

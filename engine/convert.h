@@ -18,6 +18,7 @@ struct ConvertOptions {
   bool stdout_jsonl = false;     // the target "-": JSON lines, not CSV
   const Endpoint* target = nullptr;  // --format; null: by the target's name
   std::vector<std::string> fields;   // --fields: the source fields that go, in order
+  bool wait = false;             // --wait: wait for tables other programs hold locked
 };
 
 // Runs the conversion; the exit status (0, or 1 with the message printed).

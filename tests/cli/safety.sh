@@ -78,4 +78,50 @@ for at in 0 8000000; do
   absent .zqdb-*
 done
 
+# --- A second writer -------------------------------------------------------------
+# The shell holds the table's lock as another zqdb would (flock on the table).
+cp base.dbf l.dbf && cp l.dbf l.before
+exec 9<l.dbf
+flock -x 9
+expect_run 1 convert two.csv l.dbf --mode append && expect_err "zqdb: l.dbf is in use by another program (--wait waits for it)"
+expect_run 1 cat l.dbf && expect_err "zqdb: l.dbf is being written by another program (--wait waits for it)"
+same l.dbf l.before
+flock -s 9  # a reader: other readers go on, writers don't
+expect_run 0 cat l.dbf
+expect_run 1 convert two.csv l.dbf --mode update --key NAME && expect_err "zqdb: l.dbf is in use by another program"
+same l.dbf l.before
+# --wait: the append waits for the lock and then runs.
+"$ZQDB" convert two.csv l.dbf --mode append --wait >/dev/null 2>&1 &
+waiter=$!
+sleep 0.2
+same l.dbf l.before
+flock -u 9
+wait $waiter && PASSED=$((PASSED + 1)) || fail "the waiting append failed"
+same l.dbf clean.dbf
+exec 9<&-
+# Two appends of a million records at once, both waiting: none is lost.
+cp base.dbf l.dbf
+"$ZQDB" convert big.dbf l.dbf --mode append --wait --no-progress 2>/dev/null & first=$!
+"$ZQDB" convert big.dbf l.dbf --mode append --wait --no-progress 2>/dev/null & second=$!
+wait $first && wait $second && PASSED=$((PASSED + 1)) || fail "concurrent appends failed"
+expect_run 0 info l.dbf && expect_out "records:     2000002 in the header, 2000002 live"
+
+# --- Targets that alias the source ---------------------------------------------
+# m.dbf with a memo file m.dbt; every name below would write over one of them.
+printf 'NAME,NOTE\nann,first memo\n' >memo.csv
+expect_run 0 convert memo.csv m.dbf --schema "NAME C(10), NOTE M"
+cp m.dbf m.dbf.before && cp m.dbt m.dbt.before
+ln m.dbf hard.dbf
+for dst in m.dbf m.DBT m.dbt hard.dbf; do
+  for mode in replace append; do
+    expect_run 1 convert m.dbf "$dst" --mode $mode && err_has "would write over"
+  done
+done
+expect_run 1 convert memo.csv memo.csv && expect_err "zqdb: the target memo.csv would write over memo.csv, the source; choose another name"
+expect_run 1 convert m.dbf m.DBT && expect_err "zqdb: the target m.DBT would write over m.dbt, the source's memo file; choose another name"
+expect_run 1 convert m.dbf o.dbf --index m.dbt=NAME && err_has "would write over m.dbt"
+same m.dbf m.dbf.before
+same m.dbt m.dbt.before
+absent m.DBT o.dbf
+
 finish

@@ -222,14 +222,20 @@ int ParseArgs(int argc, char** argv, Args* args) {
   return 0;
 }
 
+// Takes a shared lock on the table a command reads, held until the command
+// ends: readers never wait for each other, only for a writer. 0, or the exit
+// status.
+int LockForReading(const Args& args, const std::string& path) {
+  static TableLocks lock;
+  std::string error;
+  lock.Add(path, false);
+  return lock.Take(args.convert.wait, &error) ? 0 : Fail(error);
+}
+
 // Opens the one table of `info` and `keys`.
 int OpenOrFail(const Args& args, SourcePtr* spoke, CodePageChoice* chosen = nullptr) {
   std::string error;
-  // Shared: readers never wait for each other, only for a writer. Held until
-  // the command ends.
-  static TableLocks lock;
-  lock.Add(args.files[0], false);
-  if (!lock.Take(args.convert.wait, &error)) return Fail(error);
+  if (int rc = LockForReading(args, args.files[0])) return rc;
   if (OpenSource(args.files[0], args.source, spoke, &error, chosen) != 0) return Fail(error);
   return 0;
 }
@@ -400,6 +406,7 @@ int CmdInfo(const Args& args) {
     return Usage("info --format takes text or json, not " + args.format);
   TableFacts t;
   t.path = args.files[0];
+  if (int rc = LockForReading(args, t.path)) return rc;
   t.have_header = ReadTableHeader(t.path, &t.header) && t.header.size > 0 && KnownVersionByte(t.header.bytes[0]);
   SourcePtr spoke;
   CodePageChoice codepage;
@@ -491,6 +498,7 @@ int CmdCat(const Args& args) {
   SourcePtr spoke;
   std::string error;
   const Endpoint& from = SourceEndpoint(path);
+  if (int rc = LockForReading(args, path)) return rc;
   if (!from.open_source(path, read, &spoke, &error)) return Fail(error);
   ZQRecord& record = *spoke->GetLayout(0);
   TableReadFix fix(spoke.get());

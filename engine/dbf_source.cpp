@@ -11,6 +11,7 @@
 #include <cstring>
 
 #include "engine/endpoints.h"
+#include "engine/text_types.h"
 #include "host/zqutil.h"
 
 namespace {
@@ -25,6 +26,31 @@ std::string Utf8(const wchar* w) {
   ZQString s;
   FormatMessage(s, u"%s", w);
   return std::string(s.c_str(), size_t(s.length()));
+}
+
+// A memo column of a type the dialect doesn't list (a FoxPro G field of a
+// table read as dBASE IV, a dBASE B field) reads as plain text, which would
+// lose what it is on the way out. Such columns get the engine's own memo or
+// binary type, by the letter of their descriptor.
+void TypeMemoColumns(ZQImport* spoke) {
+  ZQRecord& layout = *spoke->GetLayout(0);
+  bool any = false;
+  for (int i = 0; i < layout.FieldCount(); ++i) any = any || layout[i]->DataType().Usage() == 0;
+  if (!any) return;
+  ZQString facts;
+  spoke->ReportFacts(facts);
+  std::string all(facts.c_str(), size_t(facts.length()));
+  int i = 0;
+  for (size_t at = 0; (at = all.find("field: ", at)) != std::string::npos && i < layout.FieldCount(); ++i) {
+    size_t tab = all.find('\t', at);
+    char letter = tab != std::string::npos && tab + 1 < all.size() ? all[tab + 1] : 0;
+    at = tab;
+    ZQField* f = layout[i];
+    if (f->DataType().Usage() != 0 || (letter != 'G' && letter != 'B' && letter != 'M')) continue;
+    ZQDType t = letter == 'M' ? TextTypes::Get().memo : TextTypes::Get().binary;
+    t.Length(f->Length());
+    f->DataType(t);
+  }
 }
 
 }  // namespace
@@ -271,6 +297,7 @@ BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePt
     spoke->ConnectionClose();
     return rc;
   }
+  TypeMemoColumns(spoke.get());
   *out = std::move(spoke);
   return 0;
 }

@@ -12,10 +12,11 @@ void Init(TextTypes& t) {
   t.currency.Define("Float;alias=Currency;currency;decsep=.;usage=0x59");
   t.dbl.Define("Float;alias=Double;decsep=.;usage=0x42");
   t.datetime.Define("DateTime;usage=0x54");
-  const ZQDType* all[] = {&t.text,    &t.memo,     &t.numeric, &t.floating, &t.date,
-                          &t.boolean, &t.integer, &t.currency, &t.dbl,      &t.datetime};
-  for (int i = 0; i < 10; ++i) t.list[i] = all[i];
-  t.list[10] = nullptr;
+  t.binary.Define("Binary;alias=Ole;usage=0x47");
+  const ZQDType* all[] = {&t.text,    &t.memo,    &t.numeric, &t.floating, &t.date,  &t.boolean,
+                          &t.integer, &t.currency, &t.dbl,    &t.datetime, &t.binary};
+  for (int i = 0; i < 11; ++i) t.list[i] = all[i];
+  t.list[11] = nullptr;
 }
 }  // namespace
 

@@ -6,10 +6,10 @@
 #include "host/zqdtype.h"
 
 struct TextTypes {
-  ZQDType text, memo, numeric, floating, date, boolean, integer, currency, dbl, datetime;
+  ZQDType text, memo, numeric, floating, date, boolean, integer, currency, dbl, datetime, binary;
   // NULL-ended list of all of them.
-  const ZQDType* list[11];
+  const ZQDType* list[12];
   static const TextTypes& Get();
-  // The type of a letter (C M N F D L I Y B T); NULL for another letter.
+  // The type of a letter (C M N F D L I Y B T G); NULL for another letter.
   const ZQDType* ByLetter(char letter) const;
 };

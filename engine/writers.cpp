@@ -1,5 +1,6 @@
 #include "engine/writers.h"
 
+#include "engine/report.h"
 #include "engine/text_util.h"
 
 #include "host/bytescan.h"
@@ -60,11 +61,73 @@ void PutCsvString(OutBuf& out, const ZQString& s) {
   else out.Put(s.c_str(), n);
 }
 
+// Fields whose values are bytes, not text: G (OLE objects), B memos of the
+// dBASE dialects (binary memos), and M memos that hold NUL bytes (a file
+// stored as a memo). A column of a type the dialect doesn't list (a G field
+// read as dBASE IV) is taken as a memo: binary when it holds a NUL byte. CSV
+// and JSON carry them as base64, so that no byte is lost or taken for text in
+// some encoding; one warning names them at the end.
+class BinaryFields {
+ public:
+  void Begin(const ZQRecord& layout) {
+    kind_.assign(size_t(layout.FieldCount()), kText);
+    seen_.assign(size_t(layout.FieldCount()), false);
+    any_ = false;
+    for (int i = 0; i < layout.FieldCount(); ++i) {
+      const ZQField* f = layout[i];
+      char letter = char(f->DataType().Usage());
+      if (letter == 'G' || (letter == 'B' && f->FieldType() != FT_FLOAT)) kind_[size_t(i)] = kBytes;
+      else if (letter == 'M' || letter == 0) kind_[size_t(i)] = kMemo;
+      any_ = any_ || kind_[size_t(i)] != kText;
+    }
+  }
+  bool any() const { return any_; }
+  // True when the value of field `i` is to be written as base64; counts it.
+  bool IsBinary(int i, ZQField* f) {
+    uint8_t k = kind_[size_t(i)];
+    if (k == kText || f->held() != ZQField::Held::kText) return false;
+    const ZQString& s = f->StringRef();
+    if (k == kMemo && memchr(s.c_str(), 0, size_t(s.length())) == nullptr) return false;
+    ++count_;
+    if (!seen_[size_t(i)]) {
+      seen_[size_t(i)] = true;
+      names_ += std::string(names_.empty() ? "" : ", ") + f->Name();
+    }
+    return true;
+  }
+  void WarnOnce() {
+    if (count_ > 0) Warn(std::to_string(count_) + " binary values (" + names_ + ") were written as base64");
+    count_ = 0;
+  }
+
+ private:
+  enum : uint8_t { kText, kBytes, kMemo };
+  std::vector<uint8_t> kind_;
+  std::vector<bool> seen_;  // fields named in names_
+  bool any_ = false;
+  int64_t count_ = 0;
+  std::string names_;
+};
+
+void PutBase64(OutBuf& out, const ZQString& s) {
+  static const char kDigits[] = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
+  const auto* p = reinterpret_cast<const uint8_t*>(s.c_str());
+  size_t n = size_t(s.length());
+  for (size_t i = 0; i < n; i += 3) {
+    uint32_t v = uint32_t(p[i]) << 16 | (i + 1 < n ? uint32_t(p[i + 1]) << 8 : 0) | (i + 2 < n ? p[i + 2] : 0);
+    char q[4] = {kDigits[v >> 18], kDigits[v >> 12 & 63], i + 1 < n ? kDigits[v >> 6 & 63] : '=',
+                 i + 2 < n ? kDigits[v & 63] : '='};
+    out.Put(q, 4);
+  }
+}
+
 class CsvWriter : public RecordWriter {
  public:
   explicit CsvWriter(OutBuf& out) : out_(out) {}
+  void End() override { binary_.WarnOnce(); }
   void Begin(const ZQRecord& layout) override {
     RecordWriter::Columns(layout);
+    binary_.Begin(layout);
     for (size_t k = 0; k < cols_.size(); ++k) {
       if (k) out_.Put(',');
       const char* name = layout[cols_[k]]->Name();
@@ -76,6 +139,10 @@ class CsvWriter : public RecordWriter {
     for (size_t k = 0; k < cols_.size(); ++k) {
       if (k) out_.Put(',');
       ZQField* f = record.GetFieldbyPos(cols_[k]);
+      if (binary_.any() && binary_.IsBinary(cols_[k], f)) {
+        PutBase64(out_, f->StringRef());
+        continue;
+      }
       // Text, the usual case, is tested first: one predictable branch.
       if (f->held() == ZQField::Held::kText) {
         PutCsvString(out_, f->StringRef());
@@ -100,6 +167,7 @@ class CsvWriter : public RecordWriter {
 
  private:
   OutBuf& out_;
+  BinaryFields binary_;
 };
 
 // ---------------------------------------------------------------------------
@@ -108,7 +176,9 @@ class CsvWriter : public RecordWriter {
 class JsonlWriter : public RecordWriter {
  public:
   explicit JsonlWriter(OutBuf& out) : out_(out) {}
+  void End() override { binary_.WarnOnce(); }
   void Begin(const ZQRecord& layout) override {
+    binary_.Begin(layout);
     keys_.clear();
     RecordWriter::Columns(layout);
     for (size_t k = 0; k < cols_.size(); ++k) {
@@ -135,6 +205,12 @@ class JsonlWriter : public RecordWriter {
     for (size_t k = 0; k < cols_.size(); ++k) {
       out_.Put(keys_[k].data(), keys_[k].size());
       ZQField* f = record.GetFieldbyPos(cols_[k]);
+      if (binary_.any() && binary_.IsBinary(cols_[k], f)) {
+        out_.Put('"');
+        PutBase64(out_, f->StringRef());
+        out_.Put('"');
+        continue;
+      }
       switch (f->held()) {
         case ZQField::Held::kBlank: out_.Put("null", 4); break;
         case ZQField::Held::kText: {
@@ -188,6 +264,7 @@ class JsonlWriter : public RecordWriter {
 
   OutBuf& out_;
   std::vector<std::string> keys_;
+  BinaryFields binary_;
 };
 
 // ---------------------------------------------------------------------------

@@ -55,6 +55,10 @@ const OptionHelp kOptionHelp[] = {
     {"mode", "  --mode replace|append|update   make the target anew, add to it, or update it by --key\n"},
     {"key", "  --key FIELD[,FIELD]      --mode update: the fields that identify a record\n"},
     {"schema", "  --schema \"NAME C(30), BORN D, AMOUNT N(12,2), NOTE M\"   column types of a CSV source\n"},
+    {"no-infer", "  --no-infer               CSV columns the schema doesn't type are text\n"},
+    {"delimiter", "  --delimiter C            the CSV source's delimiter (default: a comma, or ; or a tab when the\n"
+                  "                           header has no comma); \"tab\" or \\t for a tab\n"},
+    {"csv-codepage", "  --csv-codepage N         the CSV source's own code page (default UTF-8)\n"},
     {"index", "  --index NAME=EXPR        convert: make the new table with this index (repeatable); NAME is a tag\n"
               "                           of the table's MDX or CDX file, or a path ending in .ndx or .idx\n"
               "  --index NAME             keys: the index to walk (a tag or an .ndx/.idx path)\n"},
@@ -170,6 +174,21 @@ int ParseArgs(int argc, char** argv, Args* args) {
       std::string v;
       if (!take(&v)) return Usage("--key needs a value");
       if (!SplitNames(v, &args->convert.key)) return Usage("--key has an empty field name");
+    } else if (a == "--no-infer") {
+      args->convert.read.no_infer = true;
+    } else if (a == "--delimiter") {
+      std::string v;
+      if (!take(&v)) return Usage("--delimiter needs a value");
+      if (v == "tab" || v == "\\t") v = "\t";
+      if (v.size() != 1 || v[0] == '"' || v[0] == '\n' || v[0] == '\r')
+        return Usage("--delimiter takes one character (or tab), not " + v);
+      args->convert.read.delimiter = v[0];
+    } else if (a == "--csv-codepage") {
+      std::string v;
+      int cp = 0;
+      if (!take(&v)) return Usage("--csv-codepage needs a value");
+      if (!ParseCodePage(v, &cp)) return Usage("unknown code page: " + v + " (" + AcceptedCodePages() + ")");
+      args->convert.read.csv_codepage = ModuleCodePage(cp);
     } else if (a == "--schema") {
       if (!take(&args->convert.read.schema)) return Usage("--schema needs a value");
     } else if (a == "--index" || a == "--unique-index") {
@@ -615,7 +634,7 @@ const Command kCommands[] = {
     {"convert", "convert SRC DST", "records from a table, CSV file or SQLite database to a table, CSV, JSON-lines, "
      "SQLite or PostgreSQL file", CmdConvert, true,
      ZQ_TABLE_OPTIONS "format fields table to mode key schema index unique-index index-form no-progress from-codepage "
-                      "to-codepage",
+                      "to-codepage no-infer delimiter csv-codepage",
      "zqdb convert customers.dbf customers.csv\n"
      "zqdb convert customers.dbf shop.sqlite --table customers\n"
      "zqdb convert customers.dbf customers.sql --format pgsql\n"

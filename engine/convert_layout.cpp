@@ -54,25 +54,25 @@ bool PlanType(ZQExport* target, const ZQField* src, Planned* out) {
     out->change = change;
     return true;
   };
-  constexpr int32_t kText = 254;
+  constexpr int32_t kText = 255;  // the longest C of every dialect (Clipper's longer ones aside)
   switch (letter) {
     case 'C':
       if (len <= kText) return take('C', FT_TEXT, len, 0, "");
-      return take('M', FT_TEXT, 0, 0, "text longer than 254 bytes stored as a memo") ||
-             take('C', FT_TEXT, kText, 0, "text cut to 254 bytes: this dialect has no memo fields");
+      return take('M', FT_TEXT, 0, 0, "text longer than 255 bytes stored as a memo") ||
+             take('C', FT_TEXT, kText, 0, "text cut to 255 bytes: this dialect has no memo fields");
     case 'M':
       return take('M', FT_TEXT, 0, 0, "") ||
-             take('C', FT_TEXT, kText, 0, "memo folded to text of 254 bytes: this dialect has no memo fields");
+             take('C', FT_TEXT, kText, 0, "memo folded to text of 255 bytes: this dialect has no memo fields");
     case 'G':
       return take('G', FT_BINARY, 0, 0, "") || take('M', FT_TEXT, 0, 0, "binary memo stored as a memo") ||
-             take('C', FT_TEXT, kText, 0, "binary memo folded to text of 254 bytes");
+             take('C', FT_TEXT, kText, 0, "binary memo folded to text of 255 bytes");
     case 'B':
       if (st.Family() == FT_FLOAT)
         return take('B', FT_FLOAT, 8, 0, "") || take('F', FT_NUMERIC, 20, 6, "double stored as F(20,6)") ||
                take('N', FT_NUMERIC, 20, 6, "double stored as N(20,6)");
       return take('B', FT_BINARY, 0, 0, "") || take('G', FT_BINARY, 0, 0, "binary memo stored as G") ||
              take('M', FT_TEXT, 0, 0, "binary memo stored as a memo") ||
-             take('C', FT_TEXT, kText, 0, "binary memo folded to text of 254 bytes");
+             take('C', FT_TEXT, kText, 0, "binary memo folded to text of 255 bytes");
     case 'N': return take('N', FT_NUMERIC, len, dec, "");
     case 'F': return take('F', FT_NUMERIC, len, dec, "") || take('N', FT_NUMERIC, len, dec, "float stored as N");
     case 'D': return take('D', FT_DATE, 0, 0, "");
@@ -85,6 +85,6 @@ bool PlanType(ZQExport* target, const ZQField* src, Planned* out) {
              take('C', FT_TEXT, 19, 0, "date-time stored as text (YYYY-MM-DDTHH:MM:SS)");
     default:
       return take('C', FT_TEXT, len > 0 && len <= kText ? len : kText, 0,
-                  len > kText ? "field of an unknown type stored as text of 254 bytes" : "");
+                  len > kText ? "field of an unknown type stored as text of 255 bytes" : "");
   }
 }

@@ -62,7 +62,7 @@ bool CsvReader::Fill() {
 bool CsvReader::SplitPlainLine(const char* p, size_t n) {
   size_t at = 0;  // start of the current field
 #if defined(__SSE2__)
-  const __m128i comma = _mm_set1_epi8(','), quote = _mm_set1_epi8('"'), cr = _mm_set1_epi8('\r');
+  const __m128i comma = _mm_set1_epi8(delim_), quote = _mm_set1_epi8('"'), cr = _mm_set1_epi8('\r');
   for (size_t i = 0; i < n; i += 16) {
     __m128i v = _mm_loadu_si128(reinterpret_cast<const __m128i*>(p + i));
     unsigned keep = n - i < 16 ? (1u << (n - i)) - 1 : 0xFFFF;
@@ -79,7 +79,7 @@ bool CsvReader::SplitPlainLine(const char* p, size_t n) {
   }
 #else
   if (memchr(p, '"', n) != nullptr || memchr(p, '\r', n) != nullptr) return false;
-  for (const char* c; (c = static_cast<const char*>(memchr(p + at, ',', n - at))) != nullptr;) {
+  for (const char* c; (c = static_cast<const char*>(memchr(p + at, delim_, n - at))) != nullptr;) {
     starts_.push_back(at);
     ends_.push_back(size_t(c - p));
     at = size_t(c - p) + 1;
@@ -132,7 +132,7 @@ bool CsvReader::Next() {
       const char* start = buf_ + pos_;
       const char* end = buf_ + len_;
       const char* p = start;
-      while (p < end && *p != ',' && *p != '\n' && *p != '\r' && *p != '"') ++p;
+      while (p < end && *p != delim_ && *p != '\n' && *p != '\r' && *p != '"') ++p;
       if (p > start) {
         if (after_quote) {
           error_ = "text behind a closing quote";
@@ -147,7 +147,7 @@ bool CsvReader::Next() {
         continue;
       }
       char c = buf_[pos_++];
-      if (c == ',') {
+      if (c == delim_) {
         starts_.push_back(field_start_);
         ends_.push_back(field_data_.size());
         field_start_ = field_data_.size();

@@ -1,5 +1,6 @@
-// A streaming RFC 4180 reader: fields separated by commas, records by CRLF or
-// LF, double quotes around fields that hold commas, quotes or line breaks.
+// A streaming RFC 4180 reader: fields separated by commas (or another
+// delimiter), records by CRLF or LF, double quotes around fields that hold
+// delimiters, quotes or line breaks.
 // Memory holds one record at a time whatever the file's size.
 #pragma once
 
@@ -16,6 +17,8 @@ class CsvReader {
   CsvReader& operator=(const CsvReader&) = delete;
 
   bool Open(const std::string& path, std::string* error);
+  // The byte between fields; ',' unless set (before the first Next).
+  void SetDelimiter(char c) { delim_ = c; }
   // Back to the first record.
   bool Rewind();
   // The next record's fields; false at the end or on an error (error() set).
@@ -39,6 +42,7 @@ class CsvReader {
   static constexpr size_t kBufSize = 1 << 20;
   static constexpr size_t kMaxRecord = 64 << 20;  // a longer record is an error
   int fd_ = -1;
+  char delim_ = ',';
   char* buf_ = nullptr;
   size_t pos_ = 0, len_ = 0;
   bool eof_ = false;

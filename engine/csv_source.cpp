@@ -8,12 +8,15 @@
 
 #include "engine/endpoints.h"
 #include "engine/text_types.h"
+#include "host/bytescan.h"
 #include "host/zqdate.h"
+#include "host/zqglob.h"
 #include "host/zqutil.h"
 
 namespace {
 
-constexpr int kLongestText = 254;  // longer text becomes a memo
+constexpr int kLongestText = 255;  // longer text becomes a memo
+constexpr int kMostDigits = 15;    // longer digit strings are codes, not numbers
 
 std::string Trim(const std::string& s) {
   size_t a = 0, b = s.size();
@@ -187,11 +190,19 @@ BATCHERR ZQFromCsv::Infer(std::vector<SchemaField>* columns) {
       if (n == 0) continue;
       Stats& s = stats[i];
       s.any = true;
+      if (codepage_ != 0) p = FieldText(i, &n);
       if (n > s.longest) s.longest = n;
+      if (no_infer_) {
+        s.is_num = s.is_date = s.is_bool = false;
+        continue;
+      }
       if (s.is_num) {
         int id, fd;
         bool neg;
-        if (ParseNumber(p, n, &id, &fd, &neg)) {
+        // A leading zero before a digit (01234, -007) is a code: a number
+        // would lose it. So is a string of more digits than a double keeps.
+        const char* digits = p + (p[0] == '-' || p[0] == '+');
+        if (ParseNumber(p, n, &id, &fd, &neg) && !(id > 1 && digits[0] == '0') && id + fd <= kMostDigits) {
           if (id > s.int_digits) s.int_digits = id;
           if (fd > s.frac_digits) s.frac_digits = fd;
           s.negative = s.negative || neg;
@@ -238,10 +249,15 @@ BATCHERR ZQFromCsv::MakeFields() {
   open_ = false;
   std::string error;
   if (target_.path.length() == 0) return ZQ_NO_FILENAME;
+  reader_.SetDelimiter(delimiter_ != 0 ? delimiter_ : DetectDelimiter());
   if (!reader_.Open(target_.path.c_str(), &error)) return LogError(4, ZQ_OPEN_ERROR, "%s", error.c_str());
   if (!reader_.Next()) return LogError(4, ZQ_OPEN_ERROR, "%s has no header row", target_.path.c_str());
   header_.clear();
-  for (size_t i = 0; i < reader_.FieldCount(); ++i) header_.push_back(Trim(reader_.FieldString(i)));
+  for (size_t i = 0; i < reader_.FieldCount(); ++i) {
+    size_t n;
+    const char* p = FieldText(i, &n);
+    header_.push_back(Trim(std::string(p, n)));
+  }
   // Types: the schema's where it names a column, inferred for the rest.
   std::vector<SchemaField> columns(header_.size());
   std::vector<bool> given(header_.size(), false);
@@ -293,6 +309,35 @@ BATCHERR ZQFromCsv::MakeFields() {
   return 0;
 }
 
+char ZQFromCsv::DetectDelimiter() const {
+  // The header line, up to 64 KiB of it: a comma anywhere keeps the comma;
+  // else the more frequent of ';' and a tab, if either is there.
+  char buf[65536];
+  FILE* f = fopen(target_.path.c_str(), "rb");
+  size_t n = f ? fread(buf, 1, sizeof buf, f) : 0;
+  if (f) fclose(f);
+  const char* nl = static_cast<const char*>(memchr(buf, '\n', n));
+  size_t line = nl ? size_t(nl - buf) : n;
+  size_t semicolons = 0, tabs = 0;
+  for (size_t i = 0; i < line; ++i) {
+    if (buf[i] == ',') return ',';
+    semicolons += buf[i] == ';';
+    tabs += buf[i] == '\t';
+  }
+  if (semicolons == 0 && tabs == 0) return ',';
+  return semicolons >= tabs ? ';' : '\t';
+}
+
+const char* ZQFromCsv::FieldText(size_t i, size_t* n) {
+  const char* p = reader_.Field(i);
+  *n = reader_.FieldLength(i);
+  if (codepage_ == 0 || !bytescan::HasHighBit(p, *n)) return p;
+  text_.CopyN(p, int32_t(*n), 0);
+  ZQGlob::ExternalToInternal(codepage_, text_);
+  *n = size_t(text_.length());
+  return text_.c_str();
+}
+
 BATCHERR ZQFromCsv::AssignRow() {
   ZQRecord* layout = GetLayout(0);
   if (reader_.FieldCount() != size_t(layout->FieldCount()))
@@ -300,8 +345,8 @@ BATCHERR ZQFromCsv::AssignRow() {
                     static_cast<long long>(reader_.Line()), int(reader_.FieldCount()), layout->FieldCount());
   for (int i = 0; i < layout->FieldCount(); ++i) {
     ZQField* f = (*layout)[i];
-    const char* p = reader_.Field(size_t(i));
-    size_t n = reader_.FieldLength(size_t(i));
+    size_t n;
+    const char* p = FieldText(size_t(i), &n);
     if (n == 0) {
       f->Blank();
       continue;
@@ -406,6 +451,9 @@ bool OpenCsvSource(const std::string& path, const ReadOptions& opts, SourcePtr* 
     if (!ParseSchema(opts.schema, &schema, error)) return false;
     source->SetSchema(schema);
   }
+  source->SetDelimiter(opts.delimiter);
+  source->SetNoInfer(opts.no_infer);
+  source->SetCodePage(opts.csv_codepage);
   ZQRecord layout;
   if (opts.into && opts.into(&layout)) source->SetTypeHints(HintsOf(layout));
   ZQConnTarget t;

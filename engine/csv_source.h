@@ -2,7 +2,8 @@
 // from a schema ("NAME C(30), BORN D, AMOUNT N(12,2), NOTE M") or are
 // inferred by one pass over the whole file: integers and decimals become N
 // with the widths seen, ISO dates D, true/false/T/F/Y/N L, other text C of the
-// longest value, and text over 254 bytes M.
+// longest value, and text over 255 bytes M. Digits with a leading zero
+// (01234) or more than 15 of them are codes, not numbers: they stay text.
 #pragma once
 
 #include <string>
@@ -27,6 +28,13 @@ class ZQFromCsv : public ZQImport {
   ~ZQFromCsv() override;
 
   void SetSchema(const std::vector<SchemaField>& schema) { schema_ = schema; }
+  // The byte between fields; 0: a comma, or ';' or a tab when the header
+  // has no comma but one of those.
+  void SetDelimiter(char c) { delimiter_ = c; }
+  // Columns the schema doesn't type are text, not inferred.
+  void SetNoInfer(bool v) { no_infer_ = v; }
+  // The file's own code page (0: UTF-8): its text is converted from it.
+  void SetCodePage(int cp) { codepage_ = cp; }
   // Types for columns of these names when the schema doesn't give them (the
   // fields of a table the records go to); names without a column are passed
   // over.
@@ -42,11 +50,18 @@ class ZQFromCsv : public ZQImport {
  private:
   BATCHERR Infer(std::vector<SchemaField>* columns);
   BATCHERR AssignRow();
+  char DetectDelimiter() const;
+  // Field `i` of the current row as UTF-8: in place, or converted into text_.
+  const char* FieldText(size_t i, size_t* n);
 
   CsvReader reader_;
   std::vector<SchemaField> schema_;
   std::vector<SchemaField> hints_;
   std::vector<std::string> header_;
+  char delimiter_ = 0;
+  bool no_infer_ = false;
+  int codepage_ = 0;
+  ZQString text_;  // scratch of FieldText
   bool open_ = false;
   int32_t next_ = 0;  // logical number of the record Next() reads next
   int64_t rows_ = 0;

@@ -20,6 +20,9 @@ struct ReadOptions {
   SourceOptions table;  // tables: --type, --dialect, --codepage, --memo
   std::string schema;   // CSV: --schema, the column types
   std::string table_name;  // SQLite: --table, the table read ("" = the only one, or the file's base name)
+  char delimiter = 0;   // CSV: --delimiter; 0: a comma, or ';' or a tab when the header has no comma
+  bool no_infer = false;  // CSV: --no-infer, every column text
+  int csv_codepage = 0;   // CSV: --csv-codepage, the file's own code page; 0: UTF-8
   // The layout of the existing table the records are added to (append and
   // update), for a source that types its columns by it (CSV: "y" read for a
   // text field stays "y", not a logical). Unset, or false: there is none.

@@ -33,7 +33,7 @@ Dec = decimal.Decimal
 HAS_MEMO = {1, 2, 4, 5, 6, 7, 8, 9}
 HAS_FLOAT = {2, 6, 7, 9}
 DB4_MEMO = {2, 5, 9}  # new memo files of these dialects are dBASE IV's
-TEXT = 254  # memos folded into text keep this much
+TEXT = 255  # memos folded into text keep this much
 
 LONG = "".join("line %03d of a long memo, " % i for i in range(30)) + "end"  # 753 bytes, several blocks
 ROWS = [
@@ -60,7 +60,7 @@ def csv_text(rows):
 
 
 def expected(memo_kept, other_reader=False):
-    """Values as a table keeps them: a memo folded into text is cut to 254
+    """Values as a table keeps them: a memo folded into text is cut to 255
     bytes of code page 1252, one byte a character here. Memo text is in the
     table's code page like the other text, for every reader."""
     del other_reader

@@ -35,7 +35,7 @@ Dec = decimal.Decimal
 CP = ["--codepage", "1252"]
 
 LONG = "".join("line %03d of a long memo, " % i for i in range(30)) + "end"  # 753 bytes: 12 blocks of 64
-TEXT = 254  # a memo folded into a text field keeps this much
+TEXT = 255  # a memo folded into a text field keeps this much
 
 # Tables of dialects 0-9: the types they all share, and a memo.
 BASIC_SCHEMA = "NAME C(20), QTY N(6), AMOUNT N(10,2), RATE F(12,4), BORN D, OK L, NOTE M"

@@ -20,6 +20,7 @@
 #include "engine/report.h"
 #include "engine/target_path.h"
 #include "engine/table_lock.h"
+#include "engine/table_output.h"
 #include "engine/writers.h"
 #include "engine/field_plan.h"
 #include "engine/text_util.h"
@@ -247,6 +248,13 @@ int ParseArgs(int argc, char** argv, Args* args) {
 int LockForReading(const Args& args, const std::string& path) {
   static TableLocks lock;
   std::string error;
+  if (!InterruptedJournals(path).empty()) {
+    // A journal left by a killed run is put back first, under an exclusive
+    // lock, so that no one reads the table half-written.
+    TableLocks exclusive;
+    exclusive.Add(path, true);
+    if (!exclusive.Take(args.convert.wait, &error) || !RecoverInterrupted(path, &error)) return Fail(error);
+  }
   lock.Add(path, false);
   return lock.Take(args.convert.wait, &error) ? 0 : Fail(error);
 }

@@ -13,6 +13,8 @@
 #include "engine/report.h"
 #include "engine/target_path.h"
 #include "engine/table_lock.h"
+#include "engine/table_output.h"
+#include "host/journal.h"
 #include "engine/transfer.h"
 
 int RunConvert(const std::string& src, const std::string& named, const ConvertOptions& opts) {
@@ -33,6 +35,11 @@ int RunConvert(const std::string& src, const std::string& named, const ConvertOp
   if (table_source) locks.Add(src, false);
   if (table_target) locks.Add(dst, true);
   if (!locks.Take(opts.wait, &error)) return Fail(error);
+  // A run on this table that was killed left its journal: put back first.
+  if (table_target && !RecoverInterrupted(dst, &error)) return Fail(error);
+  // Declared before the spokes, so that the files are closed before it
+  // restores them.
+  UndoRun undo;
   ReadOptions read = opts.read;
   WriteOptions write = opts.write;
   // A table's code page is chosen once, here: a new table written from it
@@ -69,6 +76,7 @@ int RunConvert(const std::string& src, const std::string& named, const ConvertOp
   // its memo file and its index files as they were.
   if (target->AddsToExisting() && !CheckValues(source.get(), plan, &error)) return Fail(error);
 
+  if (target->AddsToExisting() && !undo.Begin(dst, &error)) return Fail(error);
   if (!target->Open(&error)) return Fail(error);
   std::unique_ptr<KeyedRecords> keyed;
   if (opts.write.mode == 2) {
@@ -95,7 +103,15 @@ int RunConvert(const std::string& src, const std::string& named, const ConvertOp
   }
   source->ConnectionClose();
   if (ok) ok = target->Finish(counts.added, &error);
-  if (!ok) return Fail(error);
+  if (!ok) {
+    // A write that failed says why (the module only counts it).
+    if (int e = journal::LastWriteError()) error = "cannot write " + dst + ": " + strerror(e);
+    std::string undo_error;
+    if (!undo.Restore(&undo_error)) error += "; and restoring it failed: " + undo_error;
+    else if (target->AddsToExisting()) error += " (the table was left as it was before the run)";
+    return Fail(error);
+  }
+  undo.Commit();
   if (opts.write.mode == 2)
     fprintf(stderr, "zqdb: %lld records updated, %lld added\n", static_cast<long long>(counts.updated),
             static_cast<long long>(counts.added));

@@ -1,5 +1,8 @@
 #include "engine/table_output.h"
 
+#include "engine/report.h"
+#include "host/journal.h"
+
 #include <dirent.h>
 #include <signal.h>
 #include <sys/stat.h>
@@ -148,4 +151,64 @@ std::vector<std::string> Staging::Entries() const {
     closedir(d);
   }
   return names;
+}
+
+namespace {
+
+// The directory and file name of `path`.
+void DirAndName(const std::string& path, std::string* dir, std::string* name) {
+  size_t slash = path.rfind('/');
+  *dir = slash == std::string::npos ? "." : path.substr(0, slash == 0 ? 1 : slash);
+  *name = slash == std::string::npos ? path : path.substr(slash + 1);
+}
+
+const char kJournalTag[] = "-journal-";
+
+}  // namespace
+
+bool UndoRun::Begin(const std::string& table, std::string* error) {
+  std::string dir, name;
+  DirAndName(table, &dir, &name);
+  std::string path = dir + "/" + kStagingPrefix + std::to_string(getpid()) + kJournalTag + name;
+  if (!journal::Begin(path)) return *error = "cannot write " + dir + ": " + strerror(errno), false;
+  active_ = true;
+  return true;
+}
+
+bool UndoRun::Restore(std::string* error) {
+  if (!active_) return true;
+  active_ = false;
+  std::string e;
+  if (journal::RestoreActive(&e)) return true;
+  if (error != nullptr) *error = e;
+  return false;
+}
+
+void UndoRun::Commit() {
+  if (active_) journal::Commit();
+  active_ = false;
+}
+
+std::vector<std::string> InterruptedJournals(const std::string& table) {
+  std::string dir, name;
+  DirAndName(table, &dir, &name);
+  std::vector<std::string> found;
+  DIR* d = opendir(dir.c_str());
+  if (d == nullptr) return found;
+  while (struct dirent* e = readdir(d)) {
+    pid_t owner = StagingOwner(e->d_name);
+    const char* tag = owner != 0 ? strstr(e->d_name, kJournalTag) : nullptr;
+    if (tag == nullptr || name != tag + strlen(kJournalTag)) continue;
+    if (owner != getpid() && kill(owner, 0) != 0 && errno == ESRCH) found.push_back(dir + "/" + e->d_name);
+  }
+  closedir(d);
+  return found;
+}
+
+bool RecoverInterrupted(const std::string& table, std::string* error) {
+  for (const std::string& j : InterruptedJournals(table)) {
+    if (!journal::Restore(j, error)) return false;
+    Warn(table + " was restored to what it was before a run that was interrupted");
+  }
+  return true;
 }

@@ -49,3 +49,30 @@ class Staging {
   std::vector<std::string> Entries() const;
   std::string dir_, staging_;
 };
+
+// The undo journal of a run that changes a table in place (append, update):
+// the table, memo and index files get back their bytes and lengths of before
+// the run when it fails or is killed. The journal lies beside the table as
+// ".zqdb-PID-journal-NAME".
+class UndoRun {
+ public:
+  UndoRun() = default;
+  ~UndoRun() { Restore(nullptr); }
+  UndoRun(const UndoRun&) = delete;
+  UndoRun& operator=(const UndoRun&) = delete;
+  bool Begin(const std::string& table, std::string* error);
+  // Puts the files back, once they are closed. False with `error` set when
+  // that failed (the journal then stays for the next run).
+  bool Restore(std::string* error);
+  void Commit();
+
+ private:
+  bool active_ = false;
+};
+
+// Restores `table` from the journal of a run whose process is gone, if one
+// lies beside it; a warning says so. False with `error` set when the journal
+// couldn't be put back.
+bool RecoverInterrupted(const std::string& table, std::string* error);
+// The journals of runs on `table` whose process is gone.
+std::vector<std::string> InterruptedJournals(const std::string& table);

@@ -1,5 +1,7 @@
 #include "host/filecache.h"
 
+#include "host/journal.h"
+
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -64,11 +66,15 @@ bool WriteBack(Page* p) {
   if (n > kPage) n = kPage;
   p->dirty = false;
   if (n <= 0) return true;
+  if (!journal::BeforeWrite(f->fds.front(), at, n)) return false;
   int64_t done = 0;
   while (done < n) {
     ssize_t w = ::pwrite(f->fds.front(), p->data + done, size_t(n - done), off_t(at + done));
     if (w < 0 && errno == EINTR) continue;
-    if (w <= 0) return false;
+    if (w <= 0) {
+      journal::NoteWriteError(w == 0 ? ENOSPC : errno);
+      return false;
+    }
     done += w;
   }
   return true;

@@ -8,6 +8,7 @@
 #include <ctime>
 
 #include "host/filecache.h"
+#include "host/journal.h"
 
 namespace {
 
@@ -33,7 +34,10 @@ int _open(const char* path, int flags, int mode) {
   if (flags & kRtCreate) f |= O_CREAT;
   if (flags & kRtTruncate) f |= O_TRUNC;
   if (flags & kRtExclusive) f |= O_EXCL;
+  bool writes = (flags & 3) != kRtReadOnly;
+  if (writes && !journal::BeforeOpen(path, (flags & kRtTruncate) != 0)) return -1;
   int fd = ::open(path, f, mode);
+  if (writes) journal::Opened(fd);
   if (fd >= 0 && fd < kTracked) {
     filecache::Attach(fd, (flags & kRtTruncate) != 0);
     tracked[fd] = filecache::Attached(fd);
@@ -49,6 +53,7 @@ int _close(int fd) {
     written = filecache::Detach(fd);
   }
   int r = ::close(fd);
+  journal::Closed(fd);
   return written ? r : -1;
 }
 
@@ -92,8 +97,13 @@ int32_t _write(int fd, const void* buffer, uint32_t count) {
     if (n > 0) positions[fd] += n;
     return int32_t(n);
   }
+  if (journal::Active()) {
+    off_t at = ::lseek(fd, 0, SEEK_CUR);
+    if (at >= 0 && !journal::BeforeWrite(fd, at, count)) return -1;
+  }
   do n = ::write(fd, buffer, count);
   while (n < 0 && errno == EINTR);
+  if (n < 0) journal::NoteWriteError(errno);
   return int32_t(n);
 }
 

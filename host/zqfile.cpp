@@ -1,5 +1,7 @@
 #include "host/zqfile.h"
 
+#include "host/journal.h"
+
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -25,8 +27,12 @@ int ZQFileProxy::openfile(const char* path, const char* mode, ZQ_CSET) {
   else if (strcmp(mode, "r+b") == 0 || strcmp(mode, "rb+") == 0 || strcmp(mode, "r+") == 0) flags = O_RDWR;
   else if (strcmp(mode, "wb") == 0 || strcmp(mode, "w") == 0) flags = O_RDWR | O_CREAT | O_TRUNC;
   else return -1;
+  // An open undo journal keeps the file's length (and the bytes a cut
+  // loses) before the open.
+  if (flags != O_RDONLY && !journal::BeforeOpen(path, (flags & O_TRUNC) != 0)) return -1;
   int fd = ::open(path, flags | O_CLOEXEC, 0644);
   if (fd < 0) return -1;
+  if (flags != O_RDONLY) journal::Opened(fd);
   struct stat st;
   if (fstat(fd, &st) != 0 || S_ISDIR(st.st_mode)) {
     ::close(fd);
@@ -61,10 +67,15 @@ bool ZQFileProxy::LoadHead() {
 
 bool ZQFileProxy::WriteOut(const char* p, int64_t off, int64_t len) {
   if (error_) return false;
+  if (!journal::BeforeWrite(fd_, off, len)) {
+    error_ = true;
+    return false;
+  }
   while (len > 0) {
     ssize_t n = pwrite(fd_, p, size_t(len), off);
     if (n < 0 && errno == EINTR) continue;
     if (n <= 0) {
+      journal::NoteWriteError(n == 0 ? ENOSPC : errno);
       error_ = true;
       return false;
     }
@@ -110,6 +121,7 @@ bool ZQFileProxy::flush() {
 int ZQFileProxy::close(bool) {
   if (fd_ < 0) return -1;
   bool ok = flush();
+  journal::Closed(fd_);
   if (::close(fd_) != 0) ok = false;
   fd_ = -1;
   buf_len_ = 0;

@@ -78,6 +78,15 @@ for at in 0 8000000; do
   absent .zqdb-*
 done
 
+# A killed update: the records it overwrote come back from its journal when
+# the table is next opened, here by a reader, which says so.
+seq 0 999999 | awk 'BEGIN { print "NAME,QTY" } { print "n" $1 "," ($1 + 7) % 99999 }' >changed.csv
+cp big.dbf u.dbf
+kill_when "[ \$(size .zqdb-*-journal-u.dbf) -gt 100000 ]" convert changed.csv u.dbf --mode update --key NAME
+expect_run 0 info u.dbf && err_has "zqdb: warning: u.dbf was restored to what it was before a run that was interrupted"
+same u.dbf big.dbf
+absent .zqdb-*
+
 # --- A second writer -------------------------------------------------------------
 # The shell holds the table's lock as another zqdb would (flock on the table).
 cp base.dbf l.dbf && cp l.dbf l.before
@@ -105,6 +114,27 @@ cp base.dbf l.dbf
 "$ZQDB" convert big.dbf l.dbf --mode append --wait --no-progress 2>/dev/null & second=$!
 wait $first && wait $second && PASSED=$((PASSED + 1)) || fail "concurrent appends failed"
 expect_run 0 info l.dbf && expect_out "records:     2000002 in the header, 2000002 live"
+
+# --- A full disk -----------------------------------------------------------------
+# A table with a memo file and an MDX tag on a 1 MB tmpfs; appending or
+# updating 9,000 memos fills it. The run fails with the reason, and the table,
+# memo and index files are restored byte for byte.
+if [ "$(id -u)" = 0 ] && mkdir full && mount -t tmpfs -o size=1m tmpfs full 2>/dev/null; then
+  trap 'umount "$WORK/full"; rm -rf "$WORK"' EXIT
+  seq 1 9000 | awk 'BEGIN { print "NAME,NOTE" } { print "n" $1 ",a new memo of record " $1 }' >memos.csv
+  seq 1 20 | awk 'BEGIN { print "NAME,NOTE" } { print "n" $1 ",memo " $1 }' >memos20.csv
+  expect_run 0 convert memos20.csv full/f.dbf --schema "NAME C(10), NOTE M" --index NAME=NAME
+  for f in f.dbf f.dbt f.mdx; do cp full/$f $f.before; done
+  for mode in "append" "update --key NAME"; do
+    # shellcheck disable=SC2086
+    expect_run 1 convert memos.csv full/f.dbf --mode $mode &&
+      expect_err "zqdb: cannot write full/f.dbf: No space left on device (the table was left as it was before the run)"
+    for f in f.dbf f.dbt f.mdx; do same full/$f $f.before; done
+    absent full/.zqdb-*
+  done
+else
+  echo "safety: the full-disk test needs root to mount a small tmpfs: skipped"
+fi
 
 # --- Targets that alias the source ---------------------------------------------
 # m.dbf with a memo file m.dbt; every name below would write over one of them.

@@ -13,6 +13,7 @@
 
 #include <cerrno>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <string>
 #include <vector>
@@ -105,10 +106,13 @@ class ZQToSqlite : public ZQExport {
     path_ = target.path.c_str();
     struct stat st;
     created_ = stat(path_.c_str(), &st) != 0;
-    if (sqlite3_open_v2(path_.c_str(), &db_, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, nullptr) != SQLITE_OK)
+    // One thread uses the connection: no mutex around every call.
+    if (sqlite3_open_v2(path_.c_str(), &db_, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE | SQLITE_OPEN_NOMUTEX,
+                        nullptr) != SQLITE_OK)
       return Failed(ZQ_CREATE_ERROR, "cannot open");
     // The journal keeps the database whole if the run fails or is killed.
-    if (!Exec("PRAGMA synchronous = OFF") || !Exec("BEGIN IMMEDIATE")) return Failed(ZQ_CREATE_ERROR, "cannot write");
+    // The journal is kept in memory: a failed run still rolls back.
+    if (!Exec("PRAGMA journal_mode = MEMORY") || !Exec("PRAGMA synchronous = OFF") || !Exec("BEGIN IMMEDIATE")) return Failed(ZQ_CREATE_ERROR, "cannot write");
     ZQRecord& layout = *GetLayout(0);
     std::string table = QuoteIdent(opts_.table_name), names, marks;
     for (int i = 0; i < layout.FieldCount(); ++i) {
@@ -169,8 +173,11 @@ class ZQToSqlite : public ZQExport {
       case ZQField::Held::kBool: sqlite3_bind_int(insert_, at, f->BoolVal() ? 1 : 0); break;
       case ZQField::Held::kDate: {
         const ZQDate& d = f->DateRef();
-        char buf[16];
-        snprintf(buf, sizeof buf, "%04d-%02d-%02d", int(d.Year()), int(d.Month()), int(d.Day()));
+        char buf[10];
+        PutDigits(buf, 4, d.Year());
+        PutDigits(buf + 5, 2, d.Month());
+        PutDigits(buf + 8, 2, d.Day());
+        buf[4] = buf[7] = '-';
         sqlite3_bind_text(insert_, at, buf, 10, SQLITE_TRANSIENT);
         break;
       }
@@ -181,14 +188,42 @@ class ZQToSqlite : public ZQExport {
         break;
       }
       case ZQField::Held::kText: {
-        // Numbers as the table's text: the column's affinity makes them
-        // INTEGER or REAL as they read, and keeps text that is no number.
         const ZQString& s = f->StringRef();
-        if (f->FieldType() == FT_BINARY) sqlite3_bind_blob(insert_, at, s.c_str(), int(s.length()), SQLITE_STATIC);
+        FIELDTYPE family = f->FieldType();
+        if ((family == FT_NUMERIC || family == FT_FLOAT) && BindNumber(at, s.c_str(), size_t(s.length()))) break;
+        if (family == FT_BINARY) sqlite3_bind_blob(insert_, at, s.c_str(), int(s.length()), SQLITE_STATIC);
         else sqlite3_bind_text(insert_, at, s.c_str(), int(s.length()), SQLITE_STATIC);
         break;
       }
     }
+  }
+
+  // A number held as the table's text, bound as an integer or a double:
+  // what the column's affinity would make of the text, without SQLite
+  // parsing it again. False for text that is no plain number (it goes in as
+  // text, and the affinity keeps it so).
+  bool BindNumber(int at, const char* p, size_t n) {
+    size_t i = n > 0 && (p[0] == '-' || p[0] == '+') ? 1 : 0, digits = 0, dot = n;
+    for (size_t k = i; k < n; ++k) {
+      if (p[k] >= '0' && p[k] <= '9') ++digits;
+      else if (p[k] == '.' && dot == n) dot = k;
+      else return false;
+    }
+    if (digits == 0 || digits > 15) return false;  // beyond 15 digits SQLite's own conversion decides
+    int64_t v = 0;
+    for (size_t k = i; k < n; ++k)
+      if (k != dot) v = v * 10 + (p[k] - '0');
+    if (p[0] == '-') v = -v;
+    if (dot == n) return sqlite3_bind_int64(insert_, at, v) == SQLITE_OK;
+    // Both numbers are exact doubles (15 digits, a power of ten up to
+    // 10^15), so the one division rounds as strtod would.
+    static const double kTens[] = {1e0, 1e1, 1e2, 1e3, 1e4, 1e5, 1e6, 1e7, 1e8, 1e9, 1e10, 1e11, 1e12, 1e13, 1e14, 1e15};
+    return sqlite3_bind_double(insert_, at, double(v) / kTens[n - dot - 1]) == SQLITE_OK;
+  }
+
+  // `width` decimal digits of `v` (0 <= v), zero-filled.
+  static void PutDigits(char* out, int width, int32_t v) {
+    for (int k = width - 1; k >= 0; --k, v /= 10) out[k] = char('0' + v % 10);
   }
 
   WriteOptions opts_;

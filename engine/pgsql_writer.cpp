@@ -12,6 +12,7 @@
 #include <string>
 
 #include "engine/text_util.h"
+#include "host/bytescan.h"
 #include "engine/writers.h"
 
 namespace {
@@ -130,7 +131,29 @@ class PgsqlWriter : public RecordWriter {
     else out_.Put("\\N", 2);
   }
 
+  // True when the `n` bytes of `p` need no escape: no control byte, no
+  // backslash, no DEL and nothing beyond ASCII. Eight bytes a step.
+  static bool PlainAscii(const char* p, size_t n) {
+    using namespace bytescan;
+    size_t i = 0;
+    for (; i + 8 <= n; i += 8) {
+      uint64_t v = Load64(p + i);
+      // A byte below 0x20 borrows when 0x20 is taken from it; the high bit
+      // catches 0x80 and up; DEL and backslash by their values.
+      if ((((v - kOnes * 0x20) & ~v) | v) & kHighs || HasByte(v, 0x7F) || HasByte(v, '\\')) return false;
+    }
+    for (; i < n; ++i) {
+      unsigned char c = static_cast<unsigned char>(p[i]);
+      if (c < 0x20 || c >= 0x7F || c == '\\') return false;
+    }
+    return true;
+  }
+
   void PutText(const char* s, size_t n) {
+    if (PlainAscii(s, n)) {
+      out_.Put(s, n);
+      return;
+    }
     PutEscaped(
         out_, s, n, [](unsigned char c) { return c >= 0x20 && c != '\\' && c != 0x7F; },
         [](OutBuf& o, unsigned char c) {

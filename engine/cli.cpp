@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cctype>
+#include <cerrno>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -478,7 +479,7 @@ int CmdInfo(const Args& args) {
   spoke->ConnectionClose();
   if (json) PrintInfoJson(t, error);
   else PrintInfoText(t);
-  fflush(stdout);
+  if (fflush(stdout) != 0) return Fail(std::string("cannot write the output: ") + strerror(errno));
   return error.empty() ? 0 : Fail(error);
 }
 
@@ -547,7 +548,7 @@ int CmdCat(const Args& args) {
   bool written = out.Flush();
   spoke->ConnectionClose();
   if (!message.empty()) return Fail(message);
-  if (!written) return Fail("cannot write the output");
+  if (!written) return Fail(std::string("cannot write the output: ") + strerror(out.error()));
   return 0;
 }
 

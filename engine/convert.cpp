@@ -35,6 +35,10 @@ int RunConvert(const std::string& src, const std::string& named, const ConvertOp
   if (table_source) locks.Add(src, false);
   if (table_target) locks.Add(dst, true);
   if (!locks.Take(opts.wait, &error)) return Fail(error);
+  // A table the user may not write is neither replaced nor added to, as cp
+  // refuses it (the directory would let a replace through).
+  if (table_target && access(dst.c_str(), F_OK) == 0 && access(dst.c_str(), W_OK) != 0)
+    return Fail("cannot write " + dst + ": " + strerror(errno));
   // A run on this table that was killed left its journal: put back first.
   if (table_target && !RecoverInterrupted(dst, &error)) return Fail(error);
   // Declared before the spokes, so that the files are closed before it

@@ -257,7 +257,7 @@ int WriteKeys(ZQImport* spoke, const KeysOptions& opts) {
     if (r >= records) ++beyond;
     r = opts.reverse ? walk->Prev(key) : walk->Next(key);
   }
-  if (!out.Flush()) return Fail("cannot write the output");
+  if (!out.Flush()) return Fail(std::string("cannot write the output: ") + strerror(out.error()));
   if (beyond > 0) {
     Warn(std::to_string(beyond) + " key(s) name records past the table's last (" + std::to_string(records) +
          "): the index doesn't match the table");

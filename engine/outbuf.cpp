@@ -23,6 +23,7 @@ void OutBuf::WriteAll(const char* s, size_t len) {
     if (w < 0 && errno == EINTR) continue;
     if (w <= 0) {
       failed_ = true;
+      error_ = w < 0 ? errno : ENOSPC;
       return;
     }
     s += w;

@@ -44,6 +44,8 @@ class OutBuf {
   void PutDate(int32_t y, int32_t m, int32_t d);
   bool Flush();
   bool failed() const { return failed_; }
+  // Why the write failed: an errno value, 0 when it didn't.
+  int error() const { return error_; }
 
  private:
   void WriteAll(const char* s, size_t len);
@@ -52,4 +54,5 @@ class OutBuf {
   char* buf_;
   size_t n_ = 0;
   bool failed_ = false;
+  int error_ = 0;
 };

@@ -127,11 +127,48 @@ bool Staging::Begin(const std::string& dst, std::string* work, std::string* erro
 }
 
 bool Staging::Commit(std::string* error) {
+  std::vector<std::string> names = Entries();
+  // Checked before the first rename: a destination that is a directory, or
+  // a file the user may not write (as cp refuses it), stops the move with
+  // nothing moved.
+  for (const std::string& name : names) {
+    std::string to = dir_ + "/" + name;
+    struct stat st;
+    if (lstat(to.c_str(), &st) != 0) continue;
+    if (S_ISDIR(st.st_mode)) {
+      *error = "cannot replace " + to + ": it is a directory";
+    } else if (access(to.c_str(), W_OK) != 0) {
+      *error = "cannot replace " + to + ": " + strerror(errno);
+    } else {
+      // A replaced file keeps its mode.
+      chmod((staging_ + "/" + name).c_str(), st.st_mode & 07777);
+      continue;
+    }
+    Discard();
+    return false;
+  }
+  // Each file replaced is kept as a hard link in the scratch directory until
+  // all are moved, so that a rename that fails half-way is undone.
+  struct Moved {
+    std::string to, kept;
+  };
+  std::vector<Moved> moved;
   bool ok = true;
-  for (const std::string& name : Entries())
-    if (rename((staging_ + "/" + name).c_str(), (dir_ + "/" + name).c_str()) != 0) {
+  for (const std::string& name : names) {
+    std::string from = staging_ + "/" + name, to = dir_ + "/" + name, kept = staging_ + "/.old-" + name;
+    bool had = link(to.c_str(), kept.c_str()) == 0;
+    if (rename(from.c_str(), to.c_str()) != 0) {
       *error = "cannot move " + name + " into " + dir_ + ": " + strerror(errno);
+      if (had) unlink(kept.c_str());
       ok = false;
+      break;
+    }
+    moved.push_back({to, had ? kept : ""});
+  }
+  if (!ok)
+    for (const Moved& m : moved) {
+      if (m.kept.empty()) unlink(m.to.c_str());
+      else rename(m.kept.c_str(), m.to.c_str());
     }
   Discard();
   return ok;

@@ -53,14 +53,18 @@ BATCHERR ZQToText::_CloseOutput(bool keep) {
   if (fd_ < 0) return 0;
   writer_->End();
   bool ok = out_->Flush();
+  int why = out_->error();
   writer_.reset();
   out_.reset();
-  if (close(fd_) != 0) ok = false;
+  if (close(fd_) != 0 && ok) ok = false, why = errno;
   fd_ = -1;
-  if (temp_path_.empty()) return keep && !ok ? LogError(4, ZQ_WRITE_ERROR, "cannot write %s", final_path_.c_str()) : 0;
+  const char* reason = strerror(why != 0 ? why : EIO);
+  if (temp_path_.empty())
+    return keep && !ok ? LogError(4, ZQ_WRITE_ERROR, "cannot write %s: %s", final_path_.c_str(), reason) : 0;
   if (keep && ok && rename(temp_path_.c_str(), final_path_.c_str()) == 0) return 0;
+  if (keep && ok) reason = strerror(errno);
   unlink(temp_path_.c_str());
-  if (keep) return LogError(4, ZQ_WRITE_ERROR, "cannot write %s", final_path_.c_str());
+  if (keep) return LogError(4, ZQ_WRITE_ERROR, "cannot write %s: %s", final_path_.c_str(), reason);
   return 0;
 }
 

@@ -154,4 +154,33 @@ same m.dbf m.dbf.before
 same m.dbt m.dbt.before
 absent m.DBT o.dbf
 
+# --- Moving into place, permissions -----------------------------------------------
+# A destination that is a directory stops the move before any file is moved.
+mkdir d.dbt
+expect_run 1 convert memo.csv d.dbf --schema "NAME C(10), NOTE M" && expect_err "zqdb: cannot replace ./d.dbt: it is a directory"
+absent d.dbf .zqdb-*
+# A replaced table keeps its mode; one the user may not write is refused in
+# every mode (as another user when run as root, who may write anything).
+cp m.dbf p.dbf && chmod 640 p.dbf
+expect_run 0 convert memo.csv p.dbf --schema "NAME C(10), NOTE M"
+[ "$(stat -c %a p.dbf)" = 640 ] && PASSED=$((PASSED + 1)) || fail "p.dbf lost its mode"
+mkdir shared && chmod 777 shared && cp m.dbf m.dbt memo.csv shared/ && chmod 444 shared/m.dbf && cp shared/m.dbf ro.before
+as_user=""
+[ "$(id -u)" = 0 ] && as_user="setpriv --reuid=nobody --regid=nogroup --clear-groups" && chmod 755 "$WORK"
+for mode in replace append; do
+  $as_user "$ZQDB" convert shared/memo.csv shared/m.dbf --mode $mode >"$OUT" 2>"$ERR"
+  [ $? -eq 1 ] && PASSED=$((PASSED + 1)) || fail "a read-only table was written in $mode mode"
+  expect_err "zqdb: cannot write shared/m.dbf: Permission denied"
+  same shared/m.dbf ro.before
+done
+
+# --- Output errors ------------------------------------------------------------------
+for command in "info m.dbf" "info m.dbf --format json" "cat m.dbf" "formats" "--help" "help convert" "convert m.dbf -"; do
+  # shellcheck disable=SC2086
+  "$ZQDB" $command >/dev/full 2>"$ERR"
+  [ $? -eq 1 ] && PASSED=$((PASSED + 1)) || fail "zqdb $command >/dev/full did not fail"
+  expect_err "zqdb: cannot write"
+  err_has "No space left on device"
+done
+
 finish

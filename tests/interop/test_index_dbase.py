@@ -19,39 +19,16 @@
    deep NDX file both ways as zqdb does.
 """
 
-import json
 import os
 import random
 import shutil
 import struct
-import subprocess
 import sys
 
 HERE = os.path.dirname(os.path.abspath(__file__))
 sys.path.insert(0, HERE)
-from common import Suite, run, workdir, ZQDB  # noqa: E402
-
-# Walks an index (argv: file, tag or "") and prints "W key recno" per key,
-# then seeks each key read from stdin and prints "S key recno" for the key
-# found there; "-" for none. Keys lose their trailing blanks; with a third
-# argument "hex" keys are read and printed as the hex of their bytes.
-PERL = r'''
-use strict; use XBase::Index;
-my ($file, $tag, $form) = @ARGV;
-my $hex = ($form // "") eq "hex";
-my $ix = XBase::Index->new($file, length $tag ? (tag => $tag) : ()) or die XBase::Index->errstr;
-sub show { my $k = shift; return "-" unless defined $k;
-           return unpack("H*", $k) if $hex; $k =~ s/ +$//; $k }
-$ix->prepare_select;
-while (my ($k, $r) = $ix->fetch) { print "W\t", show($k), "\t$r\n" }
-while (my $k = <STDIN>) {
-    chomp $k;
-    $k = pack("H*", $k) if $hex;
-    $ix->prepare_select_eq($k) or die $ix->errstr;
-    my ($f, $r) = $ix->fetch;
-    print "S\t", show($f), "\t", $r // 0, "\n";
-}
-'''
+from common import Suite, workdir, ZQDB  # noqa: E402
+from index_common import check_index, draw, first_records, key_pool, must, perl_walk, write_rows, zq_keys  # noqa: E402
 
 # (label, records, field width, distinct keys, fewest MDX and NDX levels)
 # A key of 100 bytes leaves 9 entries to an MDX node and 4 to an NDX node,
@@ -68,33 +45,8 @@ TREES = [
 # long runs, and then records appended to it.
 APPEND_TO, APPENDED = "four levels", 1500
 STATUS = ["open", "closed", "held", "void", ""]
-ALPHABET = "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789 -./"
 
 s = Suite("index_dbase")
-
-
-def key_pool(rng, width, distinct):
-    """`distinct` keys of up to `width` bytes, without leading or trailing
-    blanks, many sharing a long prefix so that they differ late."""
-    stems = ["".join(rng.choice(ALPHABET) for _ in range(width * 2 // 3)).strip() for _ in range(3)]
-    pool = {""}  # a blank key sorts first
-    while len(pool) < distinct:
-        tail = "".join(rng.choice(ALPHABET) for _ in range(rng.randrange(1, width // 3 + 2)))
-        pool.add((rng.choice(stems + [""]) + tail)[:width].strip())
-    return sorted(pool)
-
-
-def draw(rng, pool, n):
-    """n keys from the pool in random order; a tenth of them one key, so that
-    runs of equal keys span several nodes."""
-    common = pool[len(pool) // 2]
-    return [common if rng.random() < 0.1 else rng.choice(pool) for _ in range(n)]
-
-
-def write_rows(path, header, rows):
-    with open(path, "w", encoding="ascii", newline="") as f:
-        f.write(header + "\r\n")
-        f.writelines(",".join(map(str, r)) + "\r\n" for r in rows)
 
 
 def status(recno):
@@ -103,31 +55,6 @@ def status(recno):
 
 def write_csv(path, keys, first_id):
     write_rows(path, "ID,K,G", ((first_id + i, k, status(first_id + i)) for i, k in enumerate(keys)))
-
-
-def must(cmd):
-    rc, out, err = run(cmd)
-    if rc != 0:
-        raise AssertionError("%s: exit %d: %s" % (os.path.basename(cmd[0]), rc, err.strip()[-400:]))
-    return out
-
-
-def zq_keys(table, index, *opts):
-    out = must([ZQDB, "keys", table, "--index", index, "--format", "jsonl", *opts])
-    return [(r["key"], r["recno"]) for r in map(json.loads, out.splitlines())]
-
-
-def perl_walk(index, tag="", seek=(), form=""):
-    """(walk, seeks) as Perl XBase reads them: lists of (key, recno)."""
-    p = subprocess.run(["perl", "-e", PERL, index, tag, form], input="".join(k + "\n" for k in seek).encode(),
-                       capture_output=True, timeout=120)
-    if p.returncode != 0:
-        raise AssertionError("perl: " + p.stderr.decode(errors="replace")[-400:])
-    walk, found = [], []
-    for line in p.stdout.decode("latin-1").splitlines():
-        kind, key, recno = line.split("\t")
-        (walk if kind == "W" else found).append((key, int(recno)))
-    return walk, found
 
 
 def levels(index, tag=None):
@@ -154,29 +81,8 @@ def levels(index, tag=None):
     return depth
 
 
-def first_records(walk):
-    """The first record number of each distinct key of a walk."""
-    first = {}
-    for k, r in walk:
-        first.setdefault(k, r)
-    return first
-
-
-def check_index(label, table, index, tag, recs):
-    """zqdb's walk is `recs` (id -> key) in key order, one key per record;
-    Perl walks it alike and its seek finds each distinct key's first record."""
-    name = tag or index
-    zq = zq_keys(table, name)
-    s.check(label + " zqdb count", len(zq) == len(recs), "%d keys, %d records" % (len(zq), len(recs)))
-    s.check(label + " zqdb key order", [k for k, _ in zq] == sorted(recs.values()))
-    s.check(label + " zqdb records", sorted(zq) == sorted((k, r) for r, k in recs.items()))
-    first = first_records(zq)
-    walk, found = perl_walk(index, tag or "", seek=list(first))
-    s.check(label + " Perl walk", walk == zq, "%d keys from Perl, %d from zqdb; first difference at %s" % (
-        len(walk), len(zq), next((i for i, (a, b) in enumerate(zip(walk, zq)) if a != b), min(len(walk), len(zq)))))
-    bad = [(k, r, f) for (k, r), f in zip(first.items(), found) if f != (k, r)]
-    s.check(label + " Perl seek", len(found) == len(first) and not bad, "%d of %d seeks wrong: %s" % (
-        len(bad), len(first), bad[:3]))
+def pairs(recs):
+    return [(k, r) for r, k in recs.items()]
 
 
 def convert(d, name, keys, *opts):
@@ -203,8 +109,8 @@ def character_trees(d, tool):
             got = (levels(mdx, "K"), levels(ndx))
             s.check(label + " depth", got[0] >= mdx_levels and got[1] >= ndx_levels,
                     "MDX %d, NDX %d levels" % got)
-            check_index(label + " MDX", table, mdx, "K", recs)
-            check_index(label + " NDX", table, ndx, None, recs)
+            check_index(s, label + " MDX", table, mdx, "K", pairs(recs))
+            check_index(s, label + " NDX", table, ndx, None, pairs(recs))
             if tool:
                 same_as_xbase64(label + " NDX", tool, table, ndx)
             if label == APPEND_TO:
@@ -220,8 +126,8 @@ def append(d, table, rng, pool, recs):
     must([ZQDB, "convert", csv, table, "--mode", "append", "--no-progress"])
     recs.update(enumerate(keys, first))
     mdx = table[:-4] + ".mdx"
-    check_index("append K", table, mdx, "K", recs)
-    check_index("append G", table, mdx, "G", {r: status(r) for r in recs})
+    check_index(s, "append K", table, mdx, "K", pairs(recs))
+    check_index(s, "append G", table, mdx, "G", [(status(r), r) for r in recs])
 
 
 # --- 3: numeric keys ----------------------------------------------------------

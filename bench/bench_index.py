@@ -4,8 +4,9 @@
     bench_index.py PATH_TO_ZQDB [ROWS]     (1,000,000 by default)
 
 `zqdb convert` of ROWS CSV rows into a dBASE IV table with one MDX tag over
-a 30-byte character field, keys in random order, side by side with
-- the same convert without an index,
+a 30-byte character field, and into a FoxPro table with one CDX tag over the
+same field, keys in random order, side by side with
+- the same converts without an index,
 - `LC_ALL=C sort` of the same keys, one a line: the floor, what putting
   them in order costs at the least,
 - Perl XBase building an IDX file over the table that zqdb wrote
@@ -16,7 +17,7 @@ a 30-byte character field, keys in random order, side by side with
 Prints CPU seconds (user + system) of the fastest of a few runs, as bench.py
 counts them, with the wall time beside; the time the index adds to the
 convert and its ratio to sort; Perl's time over zqdb's whole convert; and
-zqdb's peak memory with the index at a quarter of the rows, at all of them
+zqdb's peak memory with each index at a quarter of the rows, at all of them
 and at twice as many: it grows until the page cache (32 MiB) is full and not
 beyond. The CSV files are generated into bench/data/ on first use; outputs
 go to a scratch directory there.
@@ -60,8 +61,12 @@ def inputs(n):
     return csv, keys
 
 
-def convert(zqdb, csv, out, index):
-    return [zqdb, "convert", csv, out, "--schema", SCHEMA, "--no-progress"] + (["--index", "K=K"] if index else [])
+# (label, the file the tag goes in, convert options of the target)
+TARGETS = [("dBASE IV", "MDX", []), ("FoxPro", "CDX", ["--to", "foxpro"])]
+
+
+def convert(zqdb, csv, out, index, opts):
+    return [zqdb, "convert", csv, out, "--schema", SCHEMA, "--no-progress", *opts] + (["--index", "K=K"] if index else [])
 
 
 def key_count(zqdb, table):
@@ -75,31 +80,41 @@ def main():
     csv, keys = inputs(n)
     more = [n // 4, 2 * n]  # rows of the runs that show the memory
     scratch = tempfile.mkdtemp(prefix="index_out_", dir=DATA)
+    runs = []  # (label, file kind, with the index, without, [(rows, with the index)])
     try:
         out = os.path.join(scratch, "t.dbf")
-        with_ix = timed(convert(zqdb, csv, out, True), 3)
-        count = key_count(zqdb, out)
-        if count != n:
-            raise SystemExit("the MDX tag holds %d keys of %d rows" % (count, n))
-        plain = timed(convert(zqdb, csv, out, False), 3)
+        for label, kind, opts in TARGETS:
+            with_ix = timed(convert(zqdb, csv, out, True, opts), 3)
+            count = key_count(zqdb, out)
+            if count != n:
+                raise SystemExit("the %s tag holds %d keys of %d rows" % (kind, count, n))
+            plain = timed(convert(zqdb, csv, out, False, opts), 3)
+            memory = [(m, timed(convert(zqdb, inputs(m)[0], os.path.join(scratch, "m.dbf"), True, opts), 1))
+                      for m in more]
+            runs.append((label, kind, with_ix, plain, memory))
         srt = timed(["env", "LC_ALL=C", "sort", keys], 3)
         perl = timed(["perl", "-e", PERL_IDX, out, os.path.join(scratch, "t.idx")], 1)
-        memory = [(m, timed(convert(zqdb, inputs(m)[0], os.path.join(scratch, "m.dbf"), True), 1)) for m in more]
     finally:
         shutil.rmtree(scratch, ignore_errors=True)
 
-    added = with_ix[0] - plain[0]
-    print("\n%d rows, one MDX tag over C(%d), keys in random order" % (n, WIDTH))
-    print("%-34s %10s %10s %12s" % ("job", "CPU s", "wall s", "max RSS"))
-    rows = [("zqdb convert with the index", with_ix), ("zqdb convert without an index", plain),
-            ("LC_ALL=C sort of the keys", srt), ("Perl XBase::idx->create", perl)]
-    for label, t in rows + [("zqdb convert with the index, %d" % m, t) for m, t in memory]:
-        print("%-34s %10.2f %10.2f %8.1f MiB" % (label, t[0], t[2], t[1] / 1024))
-    print()
-    print("the index adds %.2f s CPU: %.1fx sort's %.2f s" % (added, added / srt[0], srt[0]))
-    print("Perl XBase takes %.1fx zqdb's whole convert with the index" % (perl[0] / with_ix[0]))
-    peaks = sorted([(n, with_ix)] + memory)
-    print("zqdb's peak memory with the index: " + ", ".join("%.1f MiB at %d rows" % (t[1] / 1024, m) for m, t in peaks))
+    print("\n%d rows, one tag over C(%d), keys in random order" % (n, WIDTH))
+    print("%-44s %10s %10s %12s" % ("job", "CPU s", "wall s", "max RSS"))
+    rows = []
+    for label, kind, with_ix, plain, memory in runs:
+        rows += [("zqdb convert to %s with one %s tag" % (label, kind), with_ix),
+                 ("zqdb convert to %s without an index" % label, plain)]
+        rows += [("zqdb convert with the %s tag, %d rows" % (kind, m), t) for m, t in memory]
+    rows += [("LC_ALL=C sort of the keys", srt), ("Perl XBase::idx->create", perl)]
+    for label, t in rows:
+        print("%-44s %10.2f %10.2f %8.1f MiB" % (label, t[0], t[2], t[1] / 1024))
+    for label, kind, with_ix, plain, memory in runs:
+        added = with_ix[0] - plain[0]
+        print()
+        print("%s: the %s tag adds %.2f s CPU: %.1fx sort's %.2f s" % (label, kind, added, added / srt[0], srt[0]))
+        print("%s: Perl XBase takes %.1fx zqdb's whole convert with the tag" % (label, perl[0] / with_ix[0]))
+        peaks = sorted([(n, with_ix)] + memory)
+        print("%s: zqdb's peak memory with the tag: " % label
+              + ", ".join("%.1f MiB at %d rows" % (t[1] / 1024, m) for m, t in peaks))
     print("\ntargets: the index adds at most 10x sort; Perl XBase takes at least 3x the whole convert;"
           " zqdb's memory flat in the table size.")
 

@@ -3,7 +3,7 @@
 # Times zqdb's read to CSV against pgdbf and python3-dbfread on generated
 # tables of 100,000, 1,000,000 and 4,000,000 records (kept in bench/data/),
 # then convert (CSV and DBF to DBF) against ogr2ogr and python3-dbf, memo
-# tables, and a convert that builds an MDX tag against sort and Perl XBase.
+# tables, and converts that build an MDX or a CDX tag against sort and Perl XBase.
 set -e
 if [ $# -lt 1 ] || [ ! -x "$1" ]; then
   echo "usage: bench/run.sh PATH_TO_ZQDB [SIZE...]" >&2

@@ -238,6 +238,8 @@ bool ZQToDbase::LayoutsMatch() {
 
 BATCHERR ZQToDbase::FieldsFitRecord() {
   const ZQDBFILE* t = dbase.Table;
+  // Not even the flag byte: a table without fields can have this too.
+  if (t->reclen == 0) return LogError(4, ZQ_READ_ERROR, lgettext(u"The header gives a record length of 0"));
   int32_t end = 0;
   for (int i = 0; i < t->fieldcount; ++i) {
     end += dbase.FieldList[i]->length;

@@ -5,7 +5,7 @@
 
 #include "engine/text_util.h"
 
-std::string TargetName(ZQExport* target, const std::string& source, const std::vector<std::string>& taken) {
+std::string TargetName(ZQExport* target, const std::string& source, TakenNames* taken) {
   ZQString first, second;
   target->FieldNameCharSet(first, second);
   size_t max = size_t(target->FieldNameMaxLength());
@@ -19,16 +19,18 @@ std::string TargetName(ZQExport* target, const std::string& source, const std::v
     if (name.empty() || strchr(first.c_str(), name[0]) == nullptr) name = "_" + name;
   }
   if (name.size() > max) name.resize(max);
-  auto used = [&](const std::string& n) {
-    for (const std::string& t : taken)
-      if (Lower(t) == Lower(n)) return true;
-    return false;
-  };
-  for (int k = 2; used(name) && k < 100000; ++k) {
+  if (taken == nullptr) return name;
+  // NAME_2, NAME_3, ...: the count goes on where the last name of this base
+  // stopped, so that n equal names cost n tries, not n * n.
+  std::string base = name;
+  int& next = taken->next[Lower(base)];
+  if (next < 2) next = 2;
+  for (int k = next; taken->Has(name) && k < 100000; ++k) {
     std::string suffix = "_" + std::to_string(k);
-    std::string base = name.substr(0, max > suffix.size() ? max - suffix.size() : 0);
-    name = base + suffix;
+    name = base.substr(0, max > suffix.size() ? max - suffix.size() : 0) + suffix;
+    next = k + 1;
   }
+  taken->Add(name);
   return name;
 }
 

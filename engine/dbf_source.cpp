@@ -5,12 +5,14 @@
 #include <unistd.h>
 
 #include <cctype>
+#include <climits>
 #include <cerrno>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
 
 #include "engine/endpoints.h"
+#include "engine/report.h"
 #include "engine/text_types.h"
 #include "host/zqutil.h"
 
@@ -258,6 +260,35 @@ void ApplyOptionText(ZQSpoke* spoke, const std::string& text) {
   spoke->SetOption(text.substr(0, eq).c_str(), text.substr(eq + 1).c_str());
 }
 
+namespace {
+
+// The number of a "name: value" line of a spoke's facts, or -1.
+int64_t Fact(const std::string& all, const char* name) {
+  std::string key = std::string(name) + ": ";
+  for (size_t at = 0; at < all.size();) {
+    if (all.compare(at, key.size(), key) == 0) return strtoll(all.c_str() + at + key.size(), nullptr, 10);
+    size_t nl = all.find('\n', at);
+    if (nl == std::string::npos) break;
+    at = nl + 1;
+  }
+  return -1;
+}
+
+}  // namespace
+
+void WarnOutOfReach(const std::string& path, const ZQSpoke* spoke) {
+  // Record positions are 32-bit offsets, the file format's own limit: a
+  // record that ends past 2 GiB can't be read.
+  ZQString text;
+  spoke->ReportFacts(text);
+  std::string facts(text.c_str(), size_t(text.length()));
+  int64_t count = Fact(facts, "records"), header = Fact(facts, "header"), record = Fact(facts, "record");
+  if (count <= 0 || header < 0 || record <= 0 || header + count * record <= INT32_MAX) return;
+  int64_t reachable = header > INT32_MAX ? 0 : (int64_t{INT32_MAX} - header) / record;
+  Warn(path + ": " + std::to_string(count - reachable) + " of its " + std::to_string(count) +
+       " records lie past 2 GiB, beyond the 32-bit record positions of the format, and can't be read");
+}
+
 BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePtr* out, std::string* error,
                     CodePageChoice* chosen) {
   TableConnector c;
@@ -298,6 +329,7 @@ BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePt
     return rc;
   }
   TypeMemoColumns(spoke.get());
+  WarnOutOfReach(path, spoke.get());
   *out = std::move(spoke);
   return 0;
 }

@@ -63,6 +63,9 @@ bool ReadTableHeader(const std::string& path, TableHeader* out);
 // 0x50)"), and the memo file's name in memo errors.
 std::string ExplainTableError(const std::string& path, const std::string& message);
 
+// One warning line when records of the open table `spoke` lie past 2 GiB.
+void WarnOutOfReach(const std::string& path, const ZQSpoke* spoke);
+
 // Opens `path`; on failure `error` holds the spoke's message and the result
 // is the spoke's code (non-zero). `chosen`, when given, tells how the code
 // page was chosen.

@@ -70,7 +70,7 @@ void FieldPlan::Match(ZQExport* target) {
     int match = -1;
     for (int i : select_)
       if (match < 0 && !used[size_t(i)] && (Lower(in[i]->Name()) == Lower(f->Name()) ||
-                               Lower(TargetName(target, in[i]->Name(), {})) == Lower(f->Name())))
+                               Lower(TargetName(target, in[i]->Name(), nullptr)) == Lower(f->Name())))
         match = i;
     if (match < 0) WarnOf("field of the table has no source field and is left blank",
                           "fields of the table have no source field and are left blank", f->Name());
@@ -89,7 +89,7 @@ void FieldPlan::Match(ZQExport* target) {
 bool FieldPlan::Plan(ZQExport* target, std::string* error) {
   ZQRecord& in = *in_;
   int cap = std::min(target->MaxFieldCount(), target->MaxNewFieldCount());
-  std::vector<std::string> names;
+  TakenNames names;
   for (int i : select_) {
     ZQField* s = in[i];
     if (int(routes_.size()) == cap) {
@@ -103,7 +103,7 @@ bool FieldPlan::Plan(ZQExport* target, std::string* error) {
              s->Name());
       continue;
     }
-    std::string name = TargetName(target, s->Name(), names);
+    std::string name = TargetName(target, s->Name(), &names);
     if (name != s->Name()) {
       if (Upper(s->Name()) == name) WarnOf("field name was upper-cased", "field names were upper-cased", s->Name() + (" -> " + name));
       else WarnOf("field name was changed", "field names were changed", s->Name() + (" -> " + name));
@@ -112,7 +112,6 @@ bool FieldPlan::Plan(ZQExport* target, std::string* error) {
     ZQField* f = out_->NewField(plan.type, name.c_str());
     if (f == nullptr) return *error = "out of memory", false;
     target->FormatSpokeField(f, s);
-    names.push_back(name);
     routes_.push_back(FieldRoute{i, name, FieldCheck{char(plan.type.Usage()), f->Length(), int16_t(f->DecLen())}});
   }
   return true;

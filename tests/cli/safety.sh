@@ -29,11 +29,12 @@ make_table src.dbf
 # the record length are refused the same way.
 cp "$REGRESS/reclen0.dbf" t0.dbf
 make_table short.dbf && printf '\x08' | dd of=short.dbf bs=1 seek=10 conv=notrunc 2>/dev/null
-for t in t0 short; do
+for t in "t0:The header gives a record length of 0" "short:Field 0 extends beyond end of record"; do
+  message=${t#*:} t=${t%%:*}
   cp $t.dbf $t.before
   for mode in "append" "update --key NAME"; do
     # shellcheck disable=SC2086
-    expect_run 1 convert src.dbf $t.dbf --mode $mode && expect_err "zqdb: Field 0 extends beyond end of record"
+    expect_run 1 convert src.dbf $t.dbf --mode $mode && expect_err "zqdb: $message"
     same $t.dbf $t.before
   done
 done
@@ -182,5 +183,19 @@ for command in "info m.dbf" "info m.dbf --format json" "cat m.dbf" "formats" "--
   expect_err "zqdb: cannot write"
   err_has "No space left on device"
 done
+
+# --- Names at scale, limits ---------------------------------------------------------
+# 512 equal column names and 20,000 distinct ones become names of a JSON line
+# (a quadratic search of the names taken would take minutes here).
+awk 'BEGIN { for (i = 1; i <= 512; i++) printf "a%s", (i < 512 ? "," : "\n"); for (i = 1; i <= 512; i++) printf "1%s", (i < 512 ? "," : "\n") }' >dup.csv
+expect_run 0 convert dup.csv dup.jsonl && expect_err "zqdb: warning: 511 field names were changed (a -> a_2, a -> a_3"
+grep -q '"a_511":1,"a_512":1}' dup.jsonl && PASSED=$((PASSED + 1)) || fail "dup.jsonl lacks a_512"
+awk 'BEGIN { for (i = 1; i <= 20000; i++) printf "c%d%s", i, (i < 20000 ? "," : "\n"); for (i = 1; i <= 20000; i++) printf "%d%s", i, (i < 20000 ? "," : "\n") }' >wide.csv
+expect_run 0 convert wide.csv wide.jsonl
+grep -q '"c20000":20000}' wide.jsonl && PASSED=$((PASSED + 1)) || fail "wide.jsonl lacks c20000"
+# A header counting 200,000,000 records of 16 bytes: those past 2 GiB are
+# out of reach of 32-bit record positions, said in one warning.
+make_table huge.dbf && printf '\x00\xc2\xeb\x0b' | dd of=huge.dbf bs=1 seek=4 conv=notrunc 2>/dev/null
+expect_run 0 info huge.dbf && expect_err "zqdb: warning: huge.dbf: 65782279 of its 200000000 records lie past 2 GiB, beyond the 32-bit record positions of the format, and can't be read"
 
 finish

@@ -283,13 +283,6 @@ std::string CodePageLine(const CodePageChoice& c) {
   return page + " (" + c.origin + (c.driver >= 0 ? std::string("; ") + driver : "") + ")";
 }
 
-const char* DialectName(int dialect) {
-  static const char* const kNames[] = {"dBASE II", "dBASE III+", "dBASE IV", "Enable", "dBASE III", "(no name)",
-                                       "FoxPro", "Enable OA (Database)", "Clipper", "Visual dBASE 5.5",
-                                       "Visual FoxPro"};
-  return dialect >= 0 && dialect <= 10 ? kNames[dialect] : "?";
-}
-
 // The facts a spoke reports, as name and value.
 std::vector<std::pair<std::string, std::string>> Facts(const ZQSpoke* spoke) {
   ZQString text;

@@ -221,6 +221,72 @@ std::string ExplainTableError(const std::string& path, const std::string& messag
   return message;
 }
 
+const char* DialectName(int dialect) {
+  static const char* const kNames[] = {"dBASE II", "dBASE III+", "dBASE IV", "Enable", "dBASE III", "(no name)",
+                                       "FoxPro", "Enable OA (Database)", "Clipper", "Visual dBASE 5.5",
+                                       "Visual FoxPro"};
+  return dialect >= 0 && dialect <= 10 ? kNames[dialect] : "?";
+}
+
+namespace {
+
+// How many field descriptors a dialect reads at most; 0 for the narrow
+// headers, whose room holds no more than the dialect reads.
+int FieldsAtOpen(int dialect) {
+  switch (dialect) {
+    case 0: case 3: return 0;
+    case 2: case 6: case 10: return 256;
+    case 8: return 1000;
+    case 9: return 1024;
+    default: return 128;
+  }
+}
+
+// The field descriptors of a wide header: 32 bytes each from offset 32 up to
+// the 0x0D that ends them, within the header length and the file. The
+// version byte goes to `version`. -1 for a file too short to tell.
+int CountDescriptors(const std::string& path, int* version) {
+  FILE* f = fopen(path.c_str(), "rb");
+  if (f == nullptr) return -1;
+  unsigned char h[32];
+  int count = -1;
+  if (fread(h, 1, sizeof h, f) == sizeof h) {
+    *version = h[0];
+    size_t header = size_t(h[8]) | size_t(h[9]) << 8;
+    count = 0;
+    unsigned char d[32];
+    for (size_t at = 32; at + 32 <= header && fread(d, 1, 32, f) == 32 && d[0] != 0x0D; at += 32) ++count;
+  }
+  fclose(f);
+  return count;
+}
+
+// A table with more field descriptors than its dialect reads would lose the
+// fields behind the limit. Without a dialect named by the user, the table
+// is read as Visual dBASE 5.5 (1024 fields, the same version bytes and
+// memo files as dBASE III and IV); with one, a warning counts what is left
+// out.
+void HoldAllFields(ZQSpoke* spoke, const std::string& path, bool chosen_by_user) {
+  int version = 0, count = CountDescriptors(path, &version);
+  ZQString v;
+  spoke->GetOption("version", v);
+  int dialect = atoi(v.c_str());
+  if (version == 0xF5 && dialect != 10) dialect = 6;  // the byte decides these two
+  if (version == 0xE5 && dialect != 10) dialect = 8;
+  int limit = FieldsAtOpen(dialect);
+  if (count < 0 || limit == 0 || count <= limit) return;
+  std::string has = path + " has " + std::to_string(count) + " fields, more than " + DialectName(dialect) +
+                    " reads (" + std::to_string(limit) + ")";
+  if (!chosen_by_user && (version & 7) == 3 && count <= FieldsAtOpen(9)) {
+    spoke->SetOption("version", "9");
+    Warn(has + ": read as Visual dBASE 5.5");
+    return;
+  }
+  Warn(has + ": the last " + std::to_string(count - limit) + " are left out");
+}
+
+}  // namespace
+
 bool ResolveConnector(const std::string& type, TableConnector* out, std::string* error) {
   ModuleRegistry& r = ModuleRegistry::Get();
   const ConnectorDef* def = type.empty() ? r.Default() : r.ByShortName(type);
@@ -311,6 +377,7 @@ BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePt
     snprintf(guess, sizeof guess, "%d", GuessDialect(path));
     spoke->SetOption("version", guess);
   }
+  HoldAllFields(spoke.get(), path, !opts.dialect.empty() || !c.def->option_text.empty());
   char buf[16];
   CodePageChoice choice = ChooseCodePage(path, opts.codepage);
   if (chosen != nullptr) *chosen = choice;

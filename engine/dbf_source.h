@@ -40,6 +40,8 @@ bool ApplyDialect(ZQSpoke* spoke, const std::string& value);
 // The dialect that a table's version byte points to, for tables opened
 // without --dialect.
 int GuessDialect(const std::string& path);
+// The name of a dialect number ("dBASE IV"), "?" for none.
+const char* DialectName(int dialect);
 // True when a file of the table's base name with the extension `ext` (in
 // lower or upper case) lies beside it.
 bool HasSibling(const std::string& path, const std::string& ext);

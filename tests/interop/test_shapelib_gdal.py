@@ -33,6 +33,19 @@ with workdir() as d:
         s.check("shapelib UTF-8 text", rows[1]["NAME"] == "Müller, \"Zoë\"" and rows[2]["NAME"] == "東京",
                 repr([r["NAME"] for r in rows]))
 
+    # shapelib writes 300 fields under the version byte 0x03, more than dBASE
+    # IV reads: zqdb reads them all (as Visual dBASE 5.5), as dbfread does.
+    wide = os.path.join(d, "wide.dbf")
+    with s.case("shapelib 300 fields"):
+        args = []
+        for i in range(1, 301):
+            args += ["-s", "F%d" % i, "2"]
+        must(["dbfcreate", wide] + args)
+        must(["dbfadd", wide] + ["v%d" % (i % 10) for i in range(1, 301)])
+    rows = s.compare_table("shapelib 300 fields", wide, [], "ascii", expect_live=1)
+    if rows:
+        s.check("the 300th field", rows[0]["F300"] == "v0", repr(rows[0].get("F300")))
+
     # GDAL: CSV to DBF with type detection (integer, real and date columns)
     # and the text in code page 1252.
     csv = os.path.join(d, "in.csv")

@@ -1,0 +1,42 @@
+# Tables with more field descriptors than their dialect reads: read whole in
+# a dialect that holds them when none was named, with one line saying so; a
+# dialect named by the user reads what it reads, and a warning counts the
+# rest.
+source "$(dirname "$0")/lib.bash" "$1"
+case $ZQDB in /*) ;; *) ZQDB=$PWD/$ZQDB ;; esac
+cd "$WORK" || exit 1
+
+# wide_table PATH N: a 0x03 table of N fields F1..FN, C(1), one record whose
+# field i holds the last digit of i.
+wide_table() {
+  local n=$2 i header=$((32 + 32 * $2 + 1)) reclen=$(($2 + 1))
+  {
+    printf '\x03\x7c\x01\x01\x01\x00\x00\x00'
+    printf "\\x$(printf %02x $((header & 255)))\\x$(printf %02x $((header >> 8)))"
+    printf "\\x$(printf %02x $((reclen & 255)))\\x$(printf %02x $((reclen >> 8)))"
+    printf '\x00%.0s' {1..20}
+    for ((i = 1; i <= n; i++)); do
+      printf 'F%-10s' "$i" | tr ' ' '\0'
+      printf 'C\x00\x00\x00\x00\x01\x00'
+      printf '\x00%.0s' {1..14}
+    done
+    printf '\x0d '
+    for ((i = 1; i <= n; i++)); do printf '%d' $((i % 10)); done
+    printf '\x1a'
+  } >"$1"
+}
+
+wide_table w300.dbf 300
+expect_run 0 info w300.dbf && expect_out "fields:      300" && expect_out "dialect:     9 (Visual dBASE 5.5)"
+expect_err "zqdb: warning: w300.dbf has 300 fields, more than dBASE IV reads (256): read as Visual dBASE 5.5"
+expect_run 0 cat w300.dbf --format jsonl && expect_out '"F256":"6","F257":"7"' && expect_out '"F300":"0"}'
+# Named by the user: read as that dialect, the rest counted.
+expect_run 0 info w300.dbf --dialect "dBASE IV" && expect_out "fields:      256"
+expect_err "zqdb: warning: w300.dbf has 300 fields, more than dBASE IV reads (256): the last 44 are left out"
+expect_run 0 info w300.dbf --dialect "dBASE III" && expect_out "fields:      128"
+expect_err "zqdb: warning: w300.dbf has 300 fields, more than dBASE III reads (128): the last 172 are left out"
+# Within the limit: no word.
+wide_table w200.dbf 200
+expect_run 0 info w200.dbf && expect_out "dialect:     2 (dBASE IV)"
+[ -s "$ERR" ] && fail "a warning for 200 fields: $(cat "$ERR")" || PASSED=$((PASSED + 1))
+finish

@@ -103,11 +103,14 @@ enum : int {
 };
 
 // One field descriptor. `name` has room for the 11 name bytes and a NUL that
-// is always there, so a name that uses all 11 bytes is kept whole.
+// is always there, so a name that uses all 11 bytes is kept whole. `length`
+// is the descriptor's length byte, except for a character field that Clipper
+// and FoxPro writers made longer than 255 bytes: its decimals byte is the
+// length's high byte (see dbopen).
 struct ZQDBFIELD {
   char name[12];
   int8_t type;
-  uint8_t length;
+  uint16_t length;
   uint8_t decimals;
 };
 

@@ -70,6 +70,30 @@ void SiblingPath(const char* name, const char* ext, char* out, size_t size) {
   delete[] base;
 }
 
+// Clipper and FoxPro writers store the length of a character field longer
+// than 255 bytes with the decimals byte as its high byte (5,000 = 0x88 +
+// 0x13 * 256). Read one byte, such a field would be 136 bytes wide and every
+// field behind it read from the wrong offset. When the lengths read so do
+// not add up to the record length and the ones read the other way for C
+// fields with decimals (which a C field never has otherwise) do, the other
+// way is taken.
+void ReadLongCharFields(ZQDBFILE* db, ZQDBFIELD** fields, int count) {
+  uint32_t plain = 1, wide = 1;
+  bool any = false;
+  for (int i = 0; i < count; ++i) {
+    plain += fields[i]->length;
+    bool long_c = fields[i]->type == 'C' && fields[i]->decimals != 0;
+    wide += fields[i]->length + (long_c ? 256u * fields[i]->decimals : 0);
+    any = any || long_c;
+  }
+  if (!any || plain == db->reclen || wide != db->reclen) return;
+  for (int i = 0; i < count; ++i) {
+    if (fields[i]->type != 'C' || fields[i]->decimals == 0) continue;
+    fields[i]->length = uint16_t(fields[i]->length + 256 * fields[i]->decimals);
+    fields[i]->decimals = 0;
+  }
+}
+
 }  // namespace
 
 int dbreadhdr2(ZQDBFILE* db, ZQDBFIELD** fields) {
@@ -101,6 +125,7 @@ int dbreadhdr2(ZQDBFILE* db, ZQDBFIELD** fields) {
   if (count < kMaxFields) fields[count] = nullptr;
   if (count == 0) return -1;
   db->fieldcount = uint16_t(count);
+  ReadLongCharFields(db, fields, count);
   db->hdrlen = uint16_t(count <= kNarrowMaxRoomFields ? kNarrowFirstRecord : 16 * count + 9);
   return 0;
 }
@@ -141,6 +166,7 @@ int dbreadhdr3(ZQDBFILE* db, ZQDBFIELD** fields) {
   }
   if (count < kMaxFields) fields[count] = nullptr;
   db->fieldcount = uint16_t(count);
+  ReadLongCharFields(db, fields, count);
   return 0;
 }
 

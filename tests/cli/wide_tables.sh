@@ -39,4 +39,26 @@ expect_err "zqdb: warning: w300.dbf has 300 fields, more than dBASE III reads (1
 wide_table w200.dbf 200
 expect_run 0 info w200.dbf && expect_out "dialect:     2 (dBASE IV)"
 [ -s "$ERR" ] && fail "a warning for 200 fields: $(cat "$ERR")" || PASSED=$((PASSED + 1))
+
+# Character fields longer than 255 bytes, their length's high byte in the
+# decimals byte: NAME C(300) (0x2C + 0x01 * 256) and QTY N(3). Read whole
+# when that reading adds up to the record length (1 + 300 + 3) and the
+# plain one (1 + 44 + 3) doesn't; else the bytes are taken as they stand.
+long_table() {  # long_table PATH RECLEN
+  {
+    printf '\x03\x7c\x01\x01\x01\x00\x00\x00\x61\x00'
+    printf "\\x$(printf %02x $(($2 & 255)))\\x$(printf %02x $(($2 >> 8)))"
+    printf '\x00%.0s' {1..20}
+    printf 'NAME\x00\x00\x00\x00\x00\x00\x00C\x00\x00\x00\x00\x2c\x01'; printf '\x00%.0s' {1..14}
+    printf 'QTY\x00\x00\x00\x00\x00\x00\x00\x00N\x00\x00\x00\x00\x03\x00'; printf '\x00%.0s' {1..14}
+    printf '\x0d '
+    head -c 299 /dev/zero | tr '\0' 'a'; printf 'z 42'
+    printf '\x1a'
+  } >"$1"
+}
+long_table long.dbf 304
+expect_run 0 info long.dbf && expect_out "  1    NAME        C      300    0" && expect_out "  2    QTY         N        3    0"
+expect_run 0 cat long.dbf && expect_out "az,42"
+long_table plain.dbf 48
+expect_run 0 info plain.dbf && expect_out "  1    NAME        C       44    1"
 finish

@@ -101,4 +101,19 @@ with workdir() as d:
     write(empty, "A C(5); B N(3,0)", "db3", "cp1252", [])
     s.compare_table("empty dBASE III", empty, [], "cp1252", expect_live=0)
 
+# A Clipper table of python3-dbf with a C field of 5,000 bytes, its length's
+# high byte in the decimals byte: read whole, and the field behind it from the
+# right offset, as dbfread reads it.
+with workdir() as d:
+    long_c = os.path.join(d, "long.dbf")
+    with s.case("C(5000) write"):
+        t = dbf.Table(long_c, "NAME C(5000); QTY N(3,0)", dbf_type="clp")
+        t.open(dbf.READ_WRITE)
+        t.append(("x" * 4999 + "y", 7))
+        t.append(("short", 8))
+        t.close()
+    rows = s.compare_table("C(5000)", long_c, [], "ascii", expect_live=2)
+    if rows:
+        s.check("C(5000) whole", rows[0]["NAME"] == "x" * 4999 + "y" and rows[0]["QTY"] == 7, repr(rows[0])[:80])
+
 s.done()

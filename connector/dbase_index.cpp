@@ -72,6 +72,7 @@ class IndexObjectWalk : public ZQIndexWalk {
     return r;
   }
   const char* Expression() const override { return expression_.c_str(); }
+  bool Broken() const override { return index_->Broken(); }
 
  private:
   ZQDBIndexBase* index_;

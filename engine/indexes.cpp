@@ -258,6 +258,11 @@ int WriteKeys(ZQImport* spoke, const KeysOptions& opts) {
     r = opts.reverse ? walk->Prev(key) : walk->Next(key);
   }
   if (!out.Flush()) return Fail(std::string("cannot write the output: ") + strerror(out.error()));
+  if (walk->Broken()) {
+    Warn("the walk of index " + opts.index + " stopped at a block it couldn't follow: the keys above are not all" +
+         " of them (zqdb check tells more)");
+    return 1;
+  }
   if (beyond > 0) {
     Warn(std::to_string(beyond) + " key(s) name records past the table's last (" + std::to_string(records) +
          "): the index doesn't match the table");

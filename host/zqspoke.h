@@ -190,6 +190,8 @@ class ZQIndexWalk {
   virtual int32_t Seek(const ZQString& key, ZQString& found) = 0;
   // The key expression as the index file holds it.
   virtual const char* Expression() const = 0;
+  // True when the last walk ended at damage rather than at its last key.
+  virtual bool Broken() const { return false; }
 };
 
 // The base of every spoke.

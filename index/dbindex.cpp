@@ -39,10 +39,25 @@ ZQDBIndexBase::~ZQDBIndexBase() {
 }
 
 bool ZQDBIndexBase::Step() {
+  if (steps < 0) return false;
   ++steps;
   if (steps < 4096) return true;  // any walk this short is bounded anyway
   int32_t size = fd == -1 ? -1 : _lseek(fd, 0, 2);
-  return size >= 0 && steps <= (int64_t(size) / 512 + 1) * kKeysPer512;
+  if (size >= 0 && steps <= (int64_t(size) / 512 + 1) * kKeysPer512) return true;
+  steps = -1;  // spent: the walk is broken off, and says so
+  return false;
+}
+
+void ZQDBIndexBase::ResetSteps() {
+  steps = 0;
+  for (ZQDBNodeBase* n = root; n != nullptr; n = n->Child()) n->ClearLostWay();
+}
+
+bool ZQDBIndexBase::Broken() const {
+  if (steps < 0) return true;
+  for (ZQDBNodeBase* n = root; n != nullptr; n = n->Child())
+    if (n->LostWay()) return true;
+  return false;
 }
 
 int32_t ZQDBIndexBase::GetRecord(int32_t n) {

@@ -46,6 +46,9 @@ class ZQ_EXPORT ZQDBIndexBase {
   // then the one before. -1 where it can't.
   virtual int32_t LastKey(ZQString& key);
   virtual int32_t PrevKey(ZQString& key);
+  // True when the last walk ended at damage (a block that couldn't be read,
+  // a walk longer than the file can hold) rather than at its last key.
+  bool Broken() const;
 
   static const char* GetToken(const char* p, ZQString& token);
   static bool ParseExpr(ZQString& expression, ZQIndexDef* def, ZQSpoke* spoke);
@@ -59,7 +62,7 @@ class ZQ_EXPORT ZQDBIndexBase {
   // A walk may take no more steps than the file can hold keys: damage (a
   // cycle of blocks) ends it instead of looping. False once that is spent.
   bool Step();
-  void ResetSteps() { steps = 0; }
+  void ResetSteps();
 
   ZQRecord fields;
   int32_t position = -1;
@@ -83,6 +86,7 @@ class ZQ_EXPORT ZQDBNodeBase {
 
   bool OK() const { return ok; }
   ZQDBNodeBase* FindLeaf();
+  ZQDBNodeBase* Child() const { return child; }
   int32_t Where() const { return where; }
   // Levels above this one: 0 at the root.
   int Depth() const;
@@ -96,6 +100,9 @@ class ZQ_EXPORT ZQDBNodeBase {
   virtual bool WriteNode() = 0;
   // Goes to the last key of the tree; -1 where the kind can't walk backwards.
   virtual int32_t LastKey(ZQString& key);
+  // A move to another block of this level failed during a walk.
+  bool LostWay() const { return lostWay; }
+  void ClearLostWay() { lostWay = false; }
 
  protected:
   int16_t keyLength;
@@ -108,4 +115,5 @@ class ZQ_EXPORT ZQDBNodeBase {
   ZQDBNodeBase* parent;
   ZQDBNodeBase* child = nullptr;
   bool ok = false;
+  bool lostWay = false;
 };

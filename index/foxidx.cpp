@@ -477,6 +477,19 @@ ZQDBFoxNode::Widths ZQDBFoxNode::WidthsFor(int keyLength, uint32_t record) {
   return w;
 }
 
+namespace {
+
+// A sibling link as a byte offset. Nodes lie on 512-byte boundaries, so a
+// link that isn't a multiple of 512 is a number of 512-byte blocks, as one
+// writer (Perl XBase's IDX files) stores them between leaves.
+int32_t SiblingOffset(uint32_t link) {
+  int32_t v = int32_t(link);
+  if (v > 0 && v % ZQDBFoxNode::kBlock != 0 && v <= INT32_MAX / ZQDBFoxNode::kBlock) return v * ZQDBFoxNode::kBlock;
+  return v;
+}
+
+}  // namespace
+
 int32_t ZQDBFoxNode::ReadNode(int32_t at) {
   if (at < 0) return -1;
   if (dirty && valid && !WriteNode()) return -1;  // a changed block is saved before it is replaced
@@ -495,8 +508,8 @@ int32_t ZQDBFoxNode::ReadNode(int32_t at) {
   }
   where = at;
   keyCount = int16_t(count);
-  leftSibling = int32_t(GetLe32(raw + kBlkLeft));
-  rightSibling = int32_t(GetLe32(raw + kBlkRight));
+  leftSibling = SiblingOffset(GetLe32(raw + kBlkLeft));
+  rightSibling = SiblingOffset(GetLe32(raw + kBlkRight));
   isLeafBlock = leafBlock;
   dirty = false;
   plan.valid = false;
@@ -676,7 +689,7 @@ int32_t ZQDBFoxNode::NextKey(ZQString& key) {
       return -1;
     }
     if (limit < 0) limit = BlocksInFile();
-    if (++hops > limit || !Load(rightSibling)) return -1;
+    if (++hops > limit || !Load(rightSibling)) return lostWay = true, -1;
     current = 0;
   }
   return KeyAt(current, key);
@@ -696,7 +709,7 @@ int32_t ZQDBFoxNode::PrevKey(ZQString& key) {
       return -1;
     }
     if (limit < 0) limit = BlocksInFile();
-    if (++hops > limit || !Load(leftSibling)) return -1;
+    if (++hops > limit || !Load(leftSibling)) return lostWay = true, -1;
     current = keyCount - 1;
   }
   return KeyAt(current, key);

@@ -209,7 +209,8 @@ int32_t ZQDBMdxNode::GetRight() {
   }
   if (parent == nullptr) return -1;
   int32_t b = static_cast<ZQDBMdxNode*>(parent)->GetRight();
-  if (b <= 0 || !Move(b)) return -1;
+  if (b <= 0) return -1;
+  if (!Move(b)) return lostWay = true, -1;
   current = 0;
   return ChildAt(0);
 }
@@ -221,7 +222,8 @@ int32_t ZQDBMdxNode::GetLeft() {
   }
   if (parent == nullptr) return -1;
   int32_t b = static_cast<ZQDBMdxNode*>(parent)->GetLeft();
-  if (b <= 0 || !Move(b)) return -1;
+  if (b <= 0) return -1;
+  if (!Move(b)) return lostWay = true, -1;
   current = keyCount;
   return ChildAt(keyCount);
 }
@@ -233,6 +235,7 @@ int32_t ZQDBMdxNode::NextKey(ZQString& key) {
     if (parent == nullptr) return Give(key);
     int32_t b = static_cast<ZQDBMdxNode*>(parent)->GetRight();
     if (b <= 0 || !Move(b)) {
+      if (b > 0) lostWay = true;
       key = "";
       return -1;
     }
@@ -254,6 +257,7 @@ int32_t ZQDBMdxNode::PrevKeyImpl(ZQString& key) {
     }
     int32_t b = static_cast<ZQDBMdxNode*>(parent)->GetLeft();
     if (b <= 0 || !Move(b)) {
+      if (b > 0) lostWay = true;
       key = "";
       return -1;
     }

@@ -108,6 +108,10 @@ ann,2
 abe,5
 OUT
 expect_run 0 keys f.dbf --index "$WORK/f.idx" && expect_out "ROME,3"
+# A walk that meets a block it can't read says so: the first leaf's right
+# sibling (offset 8 of the block at 512) points past the end of the file.
+cp f.idx broken.idx && printf '\x00\x00\x01\x00' | dd of=broken.idx bs=1 seek=520 conv=notrunc 2>/dev/null
+expect_run 1 keys f.dbf --index "$WORK/broken.idx" && err_has "stopped at a block it couldn't follow"
 
 # --- Appending where the dialect keeps no index ----------------------------
 expect_run 0 convert more.csv c.dbf --to clipper --no-progress

@@ -1,61 +1,60 @@
-# Options go before or after the file name, as "--opt value" or "--opt=value";
-# --dialect takes a number or a name in any case.
+# The command line: options before or after the file names, as "--opt value"
+# or "--opt=value"; --dialect by number or name in any case, or picked by the
+# version byte; the exit status (1 when a table can't be read, 2 for a wrong
+# command line) with its one "zqdb: " line.
 source "$(dirname "$0")/lib.bash" "$1"
 
 make_table "$WORK/t.dbf"
 expected=$(printf 'NAME,QTY\r\nalice,42\r\n')
-
 same_csv() {  # same_csv ARGS...: cat's output is the table's CSV
   "$ZQDB" "$@" >"$OUT" 2>"$ERR"
   if [ "$?" -eq 0 ] && [ "$(cat "$OUT")" = "$expected" ]; then PASSED=$((PASSED + 1))
   else fail "zqdb $*: $(head -c 200 "$OUT") $(head -c 200 "$ERR")"; fi
 }
 same_csv cat "$WORK/t.dbf"
-same_csv cat --format csv "$WORK/t.dbf"
 same_csv --format csv cat "$WORK/t.dbf"
-same_csv cat "$WORK/t.dbf" --format=csv --dialect=1
+same_csv cat "$WORK/t.dbf" --format=csv --dialect=1 --codepage=0 --memo=always
 same_csv --dialect 4 --codepage 850 cat --memo never "$WORK/t.dbf"
-same_csv cat "$WORK/t.dbf" --codepage=0 --memo=always
 
-# The dialect shows in info; the last --format or --dialect given wins.
-dialect_is() {  # dialect_is "N (Name)" ARGS...
-  local want=$1; shift
-  expect_run 0 info "$WORK/t.dbf" "$@" && expect_out "dialect:     $want"
-}
-dialect_is "2 (dBASE IV)"
-dialect_is "1 (dBASE III+)" --dialect 1
-dialect_is "4 (dBASE III)" --dialect=4
-dialect_is "8 (Clipper)" --dialect 8
-dialect_is "2 (dBASE IV)" --dialect "dBASE IV"
-dialect_is "2 (dBASE IV)" --dialect "DBASE iv"
-dialect_is "1 (dBASE III+)" --dialect "dbase iii+"
-dialect_is "4 (dBASE III)" --dialect "DBase III"
-dialect_is "6 (FoxPro)" --dialect foxpro
-dialect_is "6 (FoxPro)" --dialect FOXPRO
-dialect_is "8 (Clipper)" --dialect clipper
-dialect_is "9 (Visual dBASE 5.5)" --dialect "visual dbase 5.5"
-dialect_is "7 (Enable OA (Database))" --dialect "enable oa (database)"
-dialect_is "6 (FoxPro)" --dialect 8 --dialect FoxPro
-# Other products' names map to their dialect.
-dialect_is "1 (dBASE III+)" --dialect "Foxbase+"
-dialect_is "4 (dBASE III)" --dialect "act! for windows"
-dialect_is "6 (FoxPro)" --dialect "Telemagic (FoxPro)"
-
-# Visual FoxPro by name and number reads a 0x30 table.
+# --- Dialects ----------------------------------------------------------------
+# The dialect shows in info; the last --dialect given wins; other products'
+# names map to their dialect.
 make_table "$WORK/vfp.dbf" 30
-dialect_is_vfp() {
-  expect_run 0 info "$WORK/vfp.dbf" "$@" && expect_out "dialect:     10 (Visual FoxPro)" && expect_out "version:     0x30"
-}
-dialect_is_vfp --dialect 10
-dialect_is_vfp --dialect "visual foxpro"
-dialect_is_vfp --dialect="Visual FoxPro"
+make_table "$WORK/fox.dbf" f5  # FoxPro's byte without a memo field
+while IFS='|' read -r want table args; do
+  eval "set -- $args"
+  expect_run 0 info "$WORK/$table" "$@" && expect_out "dialect:     $want"
+done <<'X'
+2 (dBASE IV)|t.dbf|
+4 (dBASE III)|t.dbf|--dialect=4
+8 (Clipper)|t.dbf|--dialect clipper
+1 (dBASE III+)|t.dbf|--dialect "dbase iii+"
+2 (dBASE IV)|t.dbf|--dialect "DBASE iv"
+9 (Visual dBASE 5.5)|t.dbf|--dialect "visual dbase 5.5"
+7 (Enable OA (Database))|t.dbf|--dialect "enable oa (database)"
+6 (FoxPro)|t.dbf|--dialect 8 --dialect FOXPRO
+1 (dBASE III+)|t.dbf|--dialect "Foxbase+"
+4 (dBASE III)|t.dbf|--dialect "act! for windows"
+6 (FoxPro)|t.dbf|--dialect "Telemagic (FoxPro)"
+10 (Visual FoxPro)|vfp.dbf|--dialect "visual foxpro"
+10 (Visual FoxPro)|vfp.dbf|
+6 (FoxPro)|fox.dbf|--memo always
+X
 
-# A FoxPro version byte (0xF5, with no memo field) turns the dBASE IV default
-# into FoxPro.
-make_table "$WORK/fox.dbf" f5
-expect_run 0 info "$WORK/fox.dbf" --memo always && expect_out "dialect:     6 (FoxPro)"
+# Without --dialect the version byte (and for 0x8B the memo file's form)
+# picks the dialect: tables written in every dialect read back as written.
+long=$(head -c 300 /dev/zero | tr '\0' 'm')
+printf 'NAME,NOTE\nann,%s\nbob,short\n' "$long" >"$WORK/in.csv"
+for d in 0 1 2 3 4 6 7 8 9; do
+  want=$long
+  case $d in 0 | 3) want=${long:0:255} ;; esac  # no memo fields: folded to C(255)
+  expect_run 0 convert "$WORK/in.csv" "$WORK/t$d.dbf" --to "$d" --no-progress &&
+    expect_run 0 cat "$WORK/t$d.dbf" --format csv && expect_out "ann,$want"
+done
+expect_run 0 info "$WORK/t7.dbf" && expect_out "dialect:     7 (Enable OA (Database))"
+expect_run 0 info "$WORK/t2.dbf" && expect_out "dialect:     2 (dBASE IV)"
 
-# A dBASE II table needs dialect 0; under the default it is refused.
+# A dBASE II table reads under dialect 0 or by its byte; dBASE IV refuses it.
 {
   printf '\x02\x01\x00\x01\x01\x01\x06\x00'            # version, count 1, date, record length 6
   printf 'NAME\x00\x00\x00\x00\x00\x00\x00C\x05\x00\x00\x00'
@@ -63,9 +62,43 @@ expect_run 0 info "$WORK/fox.dbf" --memo always && expect_out "dialect:     6 (F
   printf '\x00%.0s' {1..496}                              # descriptor room: first record at 521
   printf ' hello'
 } >"$WORK/db2.dbf"
-expect_run 0 cat "$WORK/db2.dbf" --dialect 0 --format jsonl && expect_out '{"NAME":"hello"}'
 expect_run 0 cat "$WORK/db2.dbf" --dialect "dbase ii" --format jsonl && expect_out '{"NAME":"hello"}'
-expect_run 1 cat "$WORK/db2.dbf" --dialect 2 && expect_err "zqdb: Error opening data file"
 expect_run 0 cat "$WORK/db2.dbf" --format jsonl && expect_out '{"NAME":"hello"}'
+
+# --- Tables that can't be read: status 1, "zqdb: Error opening data file" ----
+: >"$WORK/empty.dbf"
+printf 'not a table at all, just text\n' >"$WORK/text.dbf"
+head -c 50 "$WORK/t.dbf" >"$WORK/cut.dbf"  # cut inside the field descriptors
+for args in "cat $WORK/missing.dbf" "info $WORK/missing.dbf" "cat $WORK/empty.dbf" "cat $WORK" \
+  "cat $WORK/text.dbf" "cat $WORK/cut.dbf" "cat $WORK/vfp.dbf --dialect 2" "cat $WORK/t.dbf --dialect 10" \
+  "cat $WORK/db2.dbf --dialect 2"; do
+  # shellcheck disable=SC2086
+  expect_run 1 $args && expect_err "zqdb: Error opening data file"
+  [ -s "$OUT" ] && fail "zqdb $args: output for a table that can't be read"
+done
+expect_run 1 cat "$WORK/missing.dbf" && expect_err "zqdb: Error opening data file $WORK/missing.dbf"
+
+# --- Usage errors: status 2, "zqdb: ..." first, before any table is opened ----
+expect_run 2 && expect_err "usage: zqdb"
+expect_run 2 frobnicate "$WORK/t.dbf" && expect_err "zqdb: unknown command"
+expect_run 2 cat "$WORK/t.dbf" --bogus && expect_err "zqdb: unknown option --bogus"
+expect_run 2 cat "$WORK/t.dbf" --codepage abc && expect_err "zqdb: unknown code page"
+while read -r args; do
+  eval "set -- $args"
+  expect_run 2 "$@" && expect_err "zqdb: "
+done <<X
+cat
+cat "$WORK/t.dbf" "$WORK/t.dbf"
+--verbose cat "$WORK/t.dbf"
+cat "$WORK/missing.dbf" --format xml
+cat "$WORK/t.dbf" --format
+cat "$WORK/t.dbf" --codepage 12345
+cat "$WORK/t.dbf" --memo sometimes
+cat "$WORK/t.dbf" --dialect 11
+cat "$WORK/t.dbf" --dialect -1
+cat "$WORK/t.dbf" --dialect "dBASE V"
+cat "$WORK/t.dbf" --dialect ""
+X
+expect_run 0 --help && expect_out "usage: zqdb"
 
 finish

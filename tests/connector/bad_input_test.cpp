@@ -34,37 +34,30 @@ void ExpectRefused(const std::string& name, const Bytes& bytes, int dialect = 2)
 }
 
 TEST(BadInputTest, TablesThatDontOpen) {
-  {
+  // Which headers dbopen refuses is tested at the table layer; here, the one
+  // message and the closed spoke that any refusal gives.
+  Bytes good = Good();
+  Bytes version = good;
+  version[0] = 0x31;
+  struct Case {
+    const char* name;
+    Bytes bytes;
+    int dialect;
+  } cases[] = {
+      {"bad_empty.dbf", {}, 2},
+      {"bad_cut40.dbf", Bytes(good.begin(), good.begin() + 40), 2},
+      {"bad_version10.dbf", version, 10},
+      {"bad_d2memo.dbf", DbfBuilder(0x02, true).Field("NOTE", 'M', 10).Build(), 0},
+  };
+  for (const Case& c : cases) ExpectRefused(c.name, c.bytes, c.dialect);
+
+  // Missing, and a name longer than any path the platform takes.
+  for (const std::string& path : {tests::ScratchPath("bad_missing.dbf"), std::string(5000, 'x')}) {
     tests::LogCapture log;
     Source s;
-    std::string missing = tests::ScratchPath("bad_missing.dbf");
-    EXPECT_EQ(s.Open(missing), ZQ_OPEN_ERROR);
-    EXPECT_EQ(log.Last(), "Error opening data file " + missing);
+    EXPECT_EQ(s.Open(path), ZQ_OPEN_ERROR);
+    EXPECT_EQ(log.Last(), "Error opening data file " + path);
   }
-  ExpectRefused("bad_empty.dbf", {});
-  Bytes good = Good();
-  ExpectRefused("bad_cut8.dbf", Bytes(good.begin(), good.begin() + 8));
-  ExpectRefused("bad_cut40.dbf", Bytes(good.begin(), good.begin() + 40));
-  ExpectRefused("bad_noterm.dbf", Bytes(good.begin(), good.begin() + 32 + 64));
-  Bytes version = good;
-  version[0] = 0x02;  // dBASE II's byte under dBASE IV
-  ExpectRefused("bad_version.dbf", version, 2);
-  version[0] = 0x31;
-  ExpectRefused("bad_version10.dbf", version, 10);
-
-  Bytes narrow = DbfBuilder(0x02, true).Field("NAME", 'C', 4).Record({"ab"}).Build();
-  Bytes zero = narrow;
-  PutLe16(&zero[kNarrowRecLen], 0);
-  ExpectRefused("bad_reclen0.dbf", zero, 0);
-  Bytes dbase2_memo = DbfBuilder(0x02, true).Field("NOTE", 'M', 10).Build();
-  ExpectRefused("bad_d2memo.dbf", dbase2_memo, 0);
-
-  // A name longer than any path the platform takes.
-  std::string long_name(5000, 'x');
-  tests::LogCapture log;
-  Source s;
-  EXPECT_EQ(s.Open(long_name), ZQ_OPEN_ERROR);
-  EXPECT_EQ(log.Last(), "Error opening data file " + long_name);
 }
 
 TEST(BadInputTest, NoTargetAndNoTable) {
@@ -118,18 +111,6 @@ TEST(BadInputTest, HeaderNumbersThatDontFitTheFile) {
   ASSERT_EQ(c.Open(tests::WriteScratch("bad_negcount.dbf", negative)), 0);
   EXPECT_EQ(c->GetRecord(0), ZQ_END);
   EXPECT_GE(c->EstimateRecordCount(), 0);
-
-  // 300 descriptors in a dialect that reads 128: the record stays whole.
-  DbfBuilder wide(0x03);
-  for (int i = 0; i < 300; ++i) wide.Field("F" + std::to_string(i), 'C', 1);
-  wide.Record(std::vector<std::string>(300, "a")).Deleted(std::vector<std::string>(300, "b"))
-      .Record(std::vector<std::string>(300, "c"));
-  Source d(1);
-  ASSERT_EQ(d.Open(tests::WriteScratch("bad_300.dbf", wide.Build())), 0);
-  ASSERT_EQ(d.FieldCount(), 128);
-  BATCHERR end;
-  EXPECT_EQ(d.FirstColumn(&end), (std::vector<std::string>{"a", "c"}));
-  EXPECT_EQ(end, ZQ_END);
 }
 
 }  // namespace

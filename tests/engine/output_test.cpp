@@ -113,7 +113,7 @@ TEST(PgsqlOutput, ScriptTypesAndEscapes) {
 }
 
 TEST(CsvReading, QuotesLineBreaksAndDamage) {
-  std::string path = tests::WriteTemp(
+  std::string path = tests::WriteScratch(
       "reader.csv", tests::Bytes{'a', ',', 'b', '\r', '\n', '"', 'x', ',', '"', '"', 'y', '"', ',', '\n',
                                  '"', 'm', '\n', 'l', '"', ',', 'z', '\n', '1', ',', '2'});
   CsvReader r;
@@ -135,7 +135,7 @@ TEST(CsvReading, QuotesLineBreaksAndDamage) {
   EXPECT_TRUE(r.error().empty());
 
   for (const char* bad : {"a,\"open\n", "a,b\"c\n", "\"q\"x\n"}) {
-    std::string p = tests::WriteTemp("bad.csv", tests::Bytes(bad, bad + strlen(bad)));
+    std::string p = tests::WriteScratch("bad.csv", tests::Bytes(bad, bad + strlen(bad)));
     CsvReader b;
     ASSERT_TRUE(b.Open(p, &error));
     EXPECT_FALSE(b.Next()) << bad;

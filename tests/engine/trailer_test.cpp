@@ -157,7 +157,7 @@ TEST(Trailer, DamagedTrailersAreRefusedWithAReason) {
 TEST(Trailer, ScannerSkipsForeignFilesWithOneWarning) {
   // A text file that carries a valid trailer is no module.
   tests::Bytes fake = WithTrailer(tests::Bytes(100, 'a'), trailer::EncodeTrailer());
-  std::string path = tests::WriteTemp("fake-module.so", fake);
+  std::string path = tests::WriteScratch("fake-module.so", fake);
   ModuleRegistry r;
   std::vector<std::string> warnings;
   EXPECT_FALSE(r.ScanFile(path, &warnings));
@@ -167,7 +167,7 @@ TEST(Trailer, ScannerSkipsForeignFilesWithOneWarning) {
 
   // A file without a trailer is passed over without a word.
   warnings.clear();
-  EXPECT_FALSE(r.ScanFile(tests::WriteTemp("plain.so", tests::Bytes(300, 1)), &warnings));
+  EXPECT_FALSE(r.ScanFile(tests::WriteScratch("plain.so", tests::Bytes(300, 1)), &warnings));
   EXPECT_TRUE(warnings.empty());
 
   // The real module is taken, once, whatever path names it.

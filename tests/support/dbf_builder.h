@@ -164,7 +164,7 @@ inline std::string ScratchPath(const std::string& name) {
 }
 
 // Writes bytes to a file in this process's scratch directory.
-inline std::string WriteTemp(const std::string& name, const Bytes& bytes) {
+inline std::string WriteScratch(const std::string& name, const Bytes& bytes) {
   std::string path = ScratchPath(name);
   FILE* f = fopen(path.c_str(), "wb");
   if (f == nullptr) return "";

@@ -1,4 +1,4 @@
-// Test helpers for the read path: scratch files, a capture of logged
+// Test helpers for the read path: a capture of logged
 // messages, a table opened with dbopen, and a source spoke driven the way the
 // engine drives it (factory, options, SetUserInfo, MakeFields, GetRecord
 // until 1, ConnectionClose, DeleteFromDbase).
@@ -15,15 +15,6 @@
 #include "tests/support/dbf_builder.h"
 
 namespace tests {
-
-inline std::string WriteScratch(const std::string& name, const Bytes& bytes) {
-  std::string path = ScratchPath(name);
-  FILE* f = fopen(path.c_str(), "wb");
-  if (f == nullptr) return "";
-  if (!bytes.empty()) fwrite(bytes.data(), 1, bytes.size(), f);
-  fclose(f);
-  return path;
-}
 
 // A table opened read-only with dbopen, and its descriptors; closed when it
 // goes unless Close came first.

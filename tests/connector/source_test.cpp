@@ -4,7 +4,6 @@
 #include <gtest/gtest.h>
 
 #include <algorithm>
-#include <chrono>
 #include <cstring>
 #include <random>
 #include <string>
@@ -40,19 +39,6 @@ Bytes Rec(std::initializer_list<Bytes> parts, uint8_t flag = ' ') {
   Bytes r{flag};
   for (const Bytes& p : parts) r.insert(r.end(), p.begin(), p.end());
   return r;
-}
-
-// A table whose first column holds "p<physical number>", with the records
-// whose physical numbers are in `deleted` marked deleted.
-Bytes Numbered(int count, const std::vector<int>& deleted) {
-  DbfBuilder b(0x03);
-  b.Field("PHYS", 'C', 6);
-  for (int p = 0; p < count; ++p) {
-    std::string v = "p" + std::to_string(p);
-    if (std::find(deleted.begin(), deleted.end(), p) != deleted.end()) b.Deleted({v});
-    else b.Record({v});
-  }
-  return b.Build();
 }
 
 TEST(SourceTest, LayoutAndPlainTypes) {
@@ -128,7 +114,7 @@ TEST(SourceTest, LayoutAndPlainTypes) {
 
 TEST(SourceTest, DeletedRecordsAreSkipped) {
   // Physical 0, 1 and 2 deleted, and 5; any flag but a space counts as deleted.
-  Bytes bytes = Numbered(8, {0, 1, 2, 5});
+  Bytes bytes = tests::NumberedTable(8, {0, 1, 2, 5});
   bytes[65 + 7 * 1] = 0x00;  // header 32 + 32 + 1, records of 7
   bytes[65 + 7 * 2] = 'D';
   Source s;
@@ -147,7 +133,7 @@ TEST(SourceTest, DeletedRecordsAreSkipped) {
 TEST(SourceTest, LogicalNumbersInAnyOrder) {
   // Live physical records: 1 2 4 5 7 8 9 -> logical 0..6.
   Source s;
-  ASSERT_EQ(s.Open(tests::WriteScratch("src_order.dbf", Numbered(10, {0, 3, 6}))), 0);
+  ASSERT_EQ(s.Open(tests::WriteScratch("src_order.dbf", tests::NumberedTable(10, {0, 3, 6}))), 0);
   ZQDbase& db = DbaseTestPeer::Of(s.spoke());
   ASSERT_EQ(s->GetRecord(5), 0);
   EXPECT_EQ(s.Text(0), "p8");
@@ -165,7 +151,7 @@ TEST(SourceTest, LogicalNumbersInAnyOrder) {
 
   // A fresh target starts afresh, and a first request for record 1 doesn't
   // take the deleted physical record 0 for logical 0.
-  ASSERT_EQ(s.Open(tests::WriteScratch("src_order.dbf", Numbered(10, {0, 3, 6}))), 0);
+  ASSERT_EQ(s.Open(tests::WriteScratch("src_order.dbf", tests::NumberedTable(10, {0, 3, 6}))), 0);
   EXPECT_EQ(DbaseTestPeer::HighRecord(db), -1);
   EXPECT_EQ(DbaseTestPeer::DeletedSkipped(db), 0);
   ASSERT_EQ(s->GetRecord(1), 0);
@@ -183,7 +169,7 @@ TEST(SourceTest, LargeTableInRandomOrder) {
     else live.push_back(p);
   }
   Source s;
-  ASSERT_EQ(s.Open(tests::WriteScratch("src_large.dbf", Numbered(count, deleted))), 0);
+  ASSERT_EQ(s.Open(tests::WriteScratch("src_large.dbf", tests::NumberedTable(count, deleted))), 0);
   std::vector<int> order(live.size());
   for (size_t i = 0; i < order.size(); ++i) order[i] = int(i);
   std::mt19937 rng(20240229);
@@ -228,15 +214,13 @@ TEST(SourceTest, RecordCountBeyondTheFileEndsCleanly) {
   EXPECT_EQ(s->GetRecord(4), ZQ_END);
 
   // A count of 2^31 - 1 ends as soon as the file does, and a request for a
-  // record far behind it too.
+  // record far behind it too (a read per promised record would never end).
   PutLe32(&bytes[kWideRecCount], 0x7FFFFFFF);
   bytes.pop_back();  // no end mark either
   ASSERT_EQ(s.Open(tests::WriteScratch("src_huge.dbf", bytes)), 0);
-  auto start = std::chrono::steady_clock::now();
   EXPECT_EQ(s.FirstColumn(&rc), (std::vector<std::string>{"p0", "p1"}));
   EXPECT_EQ(rc, ZQ_END);
   EXPECT_EQ(s->GetRecord(2000000000), ZQ_END);
-  EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(5));
   EXPECT_TRUE(log.entries().empty());
 }
 

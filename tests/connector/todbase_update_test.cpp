@@ -8,7 +8,6 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <string>
 #include <vector>
 
@@ -23,17 +22,8 @@ using tests::ScratchPath;
 using tests::Target;
 using tests::Written;
 
-// A table whose one column holds "p<physical number>", the records whose
-// numbers are in `deleted` marked deleted.
 std::string Numbered(const std::string& name, int count, const std::vector<int>& deleted) {
-  DbfBuilder b(0x03);
-  b.Field("PHYS", 'C', 6);
-  for (int p = 0; p < count; ++p) {
-    std::string v = "p" + std::to_string(p);
-    if (std::find(deleted.begin(), deleted.end(), p) != deleted.end()) b.Deleted({v});
-    else b.Record({v});
-  }
-  return tests::WriteScratch(name, b.Build());
+  return tests::WriteScratch(name, tests::NumberedTable(count, deleted));
 }
 
 // The records of a table as "<flag><value>" with trailing blanks cut.

@@ -145,6 +145,22 @@ class DbfBuilder {
   std::vector<Bytes> records_;
 };
 
+// A dBASE III table of one column PHYS C(6) holding "p<physical number>",
+// the records whose numbers are in `deleted` marked deleted: positions and
+// skipped records show in the values read.
+inline Bytes NumberedTable(int count, const std::vector<int>& deleted) {
+  DbfBuilder b(0x03);
+  b.Field("PHYS", 'C', 6);
+  for (int p = 0; p < count; ++p) {
+    std::string v = "p" + std::to_string(p);
+    bool gone = false;
+    for (int d : deleted) gone = gone || d == p;
+    if (gone) b.Deleted({v});
+    else b.Record({v});
+  }
+  return b.Build();
+}
+
 // A path in a directory of this process alone: the test programs (and the
 // sanitizer build) run side by side, and each would otherwise overwrite the
 // others' files. The directory goes when the process ends.

@@ -16,15 +16,15 @@
 
 namespace tests {
 
-// A table opened read-only with dbopen, and its descriptors; closed when it
+// A table opened with dbopen (read-only unless `writable`), and its descriptors; closed when it
 // goes unless Close came first.
 struct OpenedTable {
   ZQDBFIELD* fields[kMaxFields] = {};
   ZQDBFILE* db = nullptr;
   int version;  // the caller's dialect, as dbopen leaves it
 
-  OpenedTable(const std::string& path, int dialect) : version(dialect) {
-    db = dbopen(nullptr, path.c_str(), fields, &version, false);
+  OpenedTable(const std::string& path, int dialect, bool writable = false) : version(dialect) {
+    db = dbopen(nullptr, path.c_str(), fields, &version, writable);
   }
   ~OpenedTable() {
     if (db != nullptr) dbclose(fields, db);

@@ -1,5 +1,6 @@
-// What dbcreat writes for each dialect, byte for byte; dbput, dbclose and
-// dbdelete on a new table.
+// What dbcreat writes for each dialect, byte for byte (Visual FoxPro's 263
+// bytes behind the terminator, displacements and fixed binary widths
+// included); dbput, dbclose and dbdelete on a new table.
 #include <gtest/gtest.h>
 
 #include <string>
@@ -8,6 +9,7 @@
 #include "table/dbf.h"
 #include "table/memo.h"
 #include "tests/support/memo_builder.h"
+#include "tests/support/read_harness.h"
 
 namespace {
 
@@ -57,10 +59,13 @@ void TakeDate(Bytes& b, int day_off, int month_off, int year_off) {
   b[size_t(day_off)] = b[size_t(month_off)] = b[size_t(year_off)] = 0;
 }
 
-Bytes WideDescriptor(const char* name, char type, uint8_t length, uint8_t decimals) {
+// A descriptor of the wide header; Visual FoxPro's carry the field's
+// displacement in the record.
+Bytes WideDescriptor(const char* name, char type, uint8_t length, uint8_t decimals, uint32_t displacement = 0) {
   Bytes d(32, 0);
   for (size_t i = 0; name[i] != '\0'; ++i) d[i] = uint8_t(name[i]);
   d[11] = uint8_t(type);
+  PutLe32(&d[12], displacement);
   d[16] = length;
   d[17] = decimals;
   return d;
@@ -243,6 +248,96 @@ TEST(Create, WideEdgeCases) {
 ZQDBFILE* OpenRw(const std::string& path, int dialect, ZQDBFIELD** fields) {
   int v = dialect;
   return dbopen(nullptr, path.c_str(), fields, &v, true);
+}
+
+// A Visual FoxPro header (date blanked) with its descriptors, the terminator
+// and the 263 bytes behind it.
+Bytes VfpHeader(uint16_t reclen, uint8_t flags, std::initializer_list<Bytes> descriptors) {
+  Bytes h(32, 0);
+  h[0] = 0x30;
+  PutLe16(&h[8], uint16_t(32 + 32 * descriptors.size() + 264));
+  PutLe16(&h[10], reclen);
+  h[28] = flags;
+  for (const Bytes& d : descriptors) h.insert(h.end(), d.begin(), d.end());
+  h.push_back(0x0D);
+  h.resize(h.size() + 263, 0);
+  return h;
+}
+
+TEST(CreateVfp, TableWithoutMemoFields) {
+  // The caller's widths of the binary forms don't count: I is 4, T and Y 8.
+  Fields f;
+  f.Add("ID", 'I', 11).Add("NAME", 'C', 10).Add("WHEN", 'T', 19).Add("PRICE", 'Y', 20, 4).Add("AMOUNT", 'N', 8, 2);
+  std::string path = Create("vfp_plain.dbf", f, DIALECT_VFOXPRO);
+  Bytes b = tests::ReadFile(path);
+  TakeDate(b, 3, 2, 1);
+  EXPECT_EQ(b, VfpHeader(39, 0x00,  // record: 1 + 4 + 10 + 8 + 8 + 8
+                         {WideDescriptor("ID", 'I', 4, 0, 1), WideDescriptor("NAME", 'C', 10, 0, 5),
+                          WideDescriptor("WHEN", 'T', 8, 0, 15), WideDescriptor("PRICE", 'Y', 8, 4, 23),
+                          WideDescriptor("AMOUNT", 'N', 8, 2, 31)}));
+  EXPECT_FALSE(ZQFileProxy::fileExists(Sibling(path, "fpt").c_str()));
+  // Its own open takes it: the header length is read, not recomputed.
+  tests::OpenedTable t(path, DIALECT_VFOXPRO);
+  ASSERT_NE(t.db, nullptr);
+  EXPECT_EQ(t.db->hdrlen, 456);
+  EXPECT_EQ(t.db->fieldcount, 5);
+  EXPECT_EQ(t.fields[0]->length, 4);
+}
+
+TEST(CreateVfp, TableWithMemoFieldsAndProductionIndex) {
+  Fields f;
+  f.Add("NAME", 'C', 10).Add("NOTES", 'M', 10).Add("PIC", 'G', 10).Add("RATE", 'B', 10);
+  std::string path = Create("vfp_memo.dbf", f, DIALECT_VFOXPRO | kMemo, true);
+  Bytes b = tests::ReadFile(path);
+  TakeDate(b, 3, 2, 1);
+  EXPECT_EQ(b, VfpHeader(27, 0x03,  // production index and memo fields
+                         {WideDescriptor("NAME", 'C', 10, 0, 1), WideDescriptor("NOTES", 'M', 4, 0, 11),
+                          WideDescriptor("PIC", 'G', 4, 0, 15),
+                          WideDescriptor("RATE", 'B', 8, 0, 19)}));  // a double in the record, not a memo
+  EXPECT_FALSE(ZQFileProxy::fileExists(Sibling(path, "dbt").c_str()));
+  EXPECT_EQ(tests::ReadFile(Sibling(path, "fpt")), tests::FptHeader(8, 64));
+
+  // The memo engine fills it from block 8, 64 bytes a block, the header's
+  // word big-endian; a text that fits its old blocks stays where it is, a
+  // longer one goes to the end and its old blocks are lost.
+  {
+    tests::OpenedTable t(path, DIALECT_VFOXPRO, true);
+    ZQDBFILE* db = t.db;
+    ASSERT_NE(db, nullptr);
+    EXPECT_EQ(db->memoblksize, 64);
+    EXPECT_EQ(putmemo(db, 0, ZQString("first")), 8u);
+    EXPECT_EQ(putmemo(db, 0, ZQString(std::string(100, 'x').c_str())), 9u);  // (100 + 8) / 64 + 1 = 2 blocks
+    EXPECT_EQ(putmemo(db, 8, ZQString("first, longer")), 8u);
+    EXPECT_EQ(putmemo(db, 8, ZQString(std::string(70, 'y').c_str())), 11u);
+    EXPECT_EQ(deloldm(db, 11, 2), 0);  // nothing to free in this kind
+    ZQString text;
+    EXPECT_TRUE(getmemo(db, 11, 0, text));
+    EXPECT_EQ(std::string(text.c_str()), std::string(70, 'y'));
+  }
+  Bytes memo = tests::ReadFile(Sibling(path, "fpt"));
+  ASSERT_EQ(memo.size(), 13u * 64);
+  EXPECT_EQ(Bytes(memo.begin(), memo.begin() + 8), (Bytes{0, 0, 0, 13, 0, 0, 0, 64}));
+  Bytes block8 = {0, 0, 0, 1, 0, 0, 0, 13};
+  for (char c : std::string("first, longer")) block8.push_back(uint8_t(c));
+  block8.resize(64, 0);
+  EXPECT_EQ(Bytes(memo.begin() + 512, memo.begin() + 576), block8);
+}
+
+TEST(CreateVfp, DoublesOnlyGetAnEmptyMemoFile) {
+  // A caller that marks the table as having memos for a "B" field (as the
+  // target does in every dialect) gets an empty FPT file: the table's own open
+  // looks for one whenever a "B" field is there. The flags still say that the
+  // table has no memo fields.
+  Fields f;
+  f.Add("RATE", 'B', 8);
+  std::string path = Create("vfp_double.dbf", f, DIALECT_VFOXPRO | kMemo);
+  Bytes b = tests::ReadFile(path);
+  TakeDate(b, 3, 2, 1);
+  EXPECT_EQ(b, VfpHeader(9, 0x00, {WideDescriptor("RATE", 'B', 8, 0, 1)}));
+  EXPECT_EQ(tests::ReadFile(Sibling(path, "fpt")), tests::FptHeader(8, 64));
+  tests::OpenedTable t(path, DIALECT_VFOXPRO);
+  ASSERT_NE(t.db, nullptr);
+  EXPECT_EQ(t.db->memofailed, 0);
 }
 
 TEST(Put, AppendsRewritesAndCloseStampsTheCount) {

@@ -70,6 +70,7 @@ int RunConvert(const std::string& src, const std::string& named, const ConvertOp
   FieldPlan plan;
   if (!plan.Make(*source->GetLayout(0), spoke, dst, target->AddsToExisting(), select, &error)) return Fail(error);
   plan.SetTextCodePage(target->TextCodePage(), write.table.strict);
+  plan.CheckWidths(strcmp(to.name, "dbf") == 0);
   std::vector<int> key;
   if (!plan.FindKey(opts.key, &key, &error)) return Fail(error);
   if (opts.write.mode == 2 && key.empty()) return Fail("update mode needs --key");

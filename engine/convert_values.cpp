@@ -34,15 +34,18 @@ static bool IsNumberLetter(char letter) {
 }
 
 // Digits before the point of a plain decimal text (sign, digits, point,
-// digits), leading zeros left out; -1 for text of another form.
-static int32_t PlainIntegerDigits(const char* p, int32_t n) {
+// digits), leading zeros left out, and the digits behind it in `fraction`;
+// -1 for text of another form.
+static int32_t PlainIntegerDigits(const char* p, int32_t n, int32_t* fraction) {
   int32_t i = p[0] == '-' || p[0] == '+';
   while (i < n && p[i] == '0') ++i;
   int32_t start = i;
   while (i < n && p[i] >= '0' && p[i] <= '9') ++i;
   int32_t digits = i - start;
   if (i < n && p[i] == '.') ++i;
+  int32_t frac_start = i;
   while (i < n && p[i] >= '0' && p[i] <= '9') ++i;
+  *fraction = i - frac_start;
   return i == n && n > (p[0] == '-' || p[0] == '+') ? digits : -1;
 }
 
@@ -79,15 +82,21 @@ bool NumberFits(ZQField* dst, const FieldCheck& check) {
   if (dst->held() == ZQField::Held::kBlank) return true;
   if (dst->held() == ZQField::Held::kText) {
     const ZQString& s = dst->StringRef();
-    int32_t digits = PlainIntegerDigits(s.c_str(), s.length());
+    int32_t fraction = 0;
+    int32_t digits = PlainIntegerDigits(s.c_str(), s.length(), &fraction);
     if (digits < 0) {  // "1e3", " 12 ": stored by its value
       double v = dst->DoubleVal();
       if (!std::isfinite(v)) return false;
       *dst = v;
     } else if (check.letter == 'N' || check.letter == 'F') {
-      // Sign, digits, a carry of the rounding, point and decimals: if that
-      // fits, the text does.
-      if (digits + 2 + (check.decimals > 0 ? 1 + check.decimals : 0) <= check.width) return true;
+      // The text written: sign, digits (one at least), point and decimals;
+      // a carry of the rounding only when decimals are dropped. A negative
+      // zero goes the long way, its sign being the writer's to keep or not.
+      int32_t point = check.decimals > 0 ? 1 + check.decimals : 0;
+      bool negative = s.c_str()[0] == '-';
+      if (fraction <= check.decimals && (digits > 0 || !negative))
+        return negative + (digits > 0 ? digits : 1) + point <= (check.width < 255 ? check.width : 255);
+      if (digits + 2 + point <= check.width) return true;
     } else if (check.letter == 'Y') {
       return digits <= 14 || TenThousandthsFit(s.c_str(), s.length());
     }
@@ -135,14 +144,14 @@ bool CopyValue(ZQField* dst, ZQField* src, FieldCheck* check) {
       const ZQString& s = src->StringRef();
       if (check->letter == 'C' && s.length() > check->width) ++check->cut;
       dst->AssignText(s.c_str(), s.length());
-      return !IsNumberLetter(check->letter) || NumberFits(dst, *check);
+      return !check->widths || !IsNumberLetter(check->letter) || NumberFits(dst, *check);
     }
     case ZQField::Held::kLong:
       dst->SetLong(src->LongVal());
-      return !IsNumberLetter(check->letter) || NumberFits(dst, *check);
+      return !check->widths || !IsNumberLetter(check->letter) || NumberFits(dst, *check);
     case ZQField::Held::kDouble:
       *dst = src->DoubleVal();
-      return !IsNumberLetter(check->letter) || NumberFits(dst, *check);
+      return !check->widths || !IsNumberLetter(check->letter) || NumberFits(dst, *check);
     case ZQField::Held::kDate: {
       const ZQDate& d = src->DateRef();
       dst->SetDate(d.Year(), d.Month(), d.Day());

@@ -12,6 +12,7 @@ struct FieldCheck {
   char letter;
   int32_t width;
   int16_t decimals = 0;
+  bool widths = true;  // the target stores numbers in a width (a table), so they are checked
   int64_t cut = 0;
   int64_t blank_logicals = 0;  // a table's logical has no blank: they become F
 };

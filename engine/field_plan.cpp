@@ -136,6 +136,10 @@ void FieldPlan::SetTextCodePage(int codepage, bool strict) {
   strict_ = strict;
 }
 
+void FieldPlan::CheckWidths(bool check) {
+  for (FieldRoute& r : routes_) r.check.widths = check;
+}
+
 bool FieldPlan::Fill(int32_t n, std::string* error, bool again) {
   ZQRecord& in = *in_;
   ZQRecord& out = *out_;

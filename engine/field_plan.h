@@ -44,6 +44,9 @@ class FieldPlan {
   // converted to it here (the target converts the other text itself), and
   // characters it can't hold are counted, or refused with `strict`.
   void SetTextCodePage(int codepage, bool strict);
+  // Whether numbers are checked against their fields' widths: for a table,
+  // not for text that has no widths.
+  void CheckWidths(bool check);
 
   // Fills the target's record from the source's current one. False when a
   // value doesn't fit its target field, with `error` naming record `n`

@@ -53,6 +53,9 @@ class ZQ_EXPORT ZQDbaseOptions : public ZQSpokeOptions {
 // and Visual FoxPro; none for the others.
 enum class IndexFamily { kNone, kDbase, kFox };
 ZQ_EXPORT IndexFamily IndexFamilyOf(int dialect);
+// The fields of a definition's segments, borrowed, in segment order: what the
+// index classes take to make a new index.
+void IndexSegmentFields(const ZQIndexDef* def, ZQRecord& fields);
 
 // One row of the name table of the saved text form.
 struct VersionName {
@@ -104,6 +107,8 @@ class ZQ_EXPORT ZQDbase : public ZQDbaseOptions {
   ZQDBIndexBase* CreateIndex(const char* base, const ZQRecord& fields, ZQIndexDef* def);
   // Opens an index of the open table for a walk in key order; see ZQImport.
   ZQIndexWalk* OpenIndexWalk(const char* name, ZQIndexDef* def);
+  // Builds the indexes `defs` anew beside `base`; see ZQImport.
+  BATCHERR BuildIndexes(const char* base, ZQIndexDef* const* defs);
   // "index: name, expression, key type, unique, file" lines for reports.
   void ReportIndexes(ZQString& text);
   // Deletes the selected index and the CDX tag list.

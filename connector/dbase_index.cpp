@@ -2,6 +2,7 @@
 #include <new>
 
 #include "connector/dbase.h"
+#include "host/zqutil.h"
 #include "index/dbindex.h"
 #include "index/foxidx.h"
 #include "index/mdx.h"
@@ -55,8 +56,9 @@ namespace {
 // A walk over one index object, which it owns.
 class IndexObjectWalk : public ZQIndexWalk {
  public:
-  IndexObjectWalk(ZQDBIndexBase* index, bool backwards, const char* expression)
-      : index_(index), backwards_(backwards), expression_(expression) {}
+  IndexObjectWalk(ZQDBIndexBase* index, bool backwards, const char* expression, const ZQIndexDef& def,
+                  bool unique)
+      : index_(index), backwards_(backwards), expression_(expression), def_(def), unique_(unique) {}
   ~IndexObjectWalk() override { delete index_; }
   int32_t First(ZQString& key) override { return index_->FirstKey(key); }
   int32_t Next(ZQString& key) override { return index_->NextKey(key); }
@@ -73,11 +75,17 @@ class IndexObjectWalk : public ZQIndexWalk {
   }
   const char* Expression() const override { return expression_.c_str(); }
   bool Broken() const override { return index_->Broken(); }
+  void BuildKey(ZQString& key) override { index_->BuildKey(key, &def_); }
+  bool Unique() const override { return unique_; }
+  int32_t CheckTree(ZQString& findings) override { return index_->CheckTree(findings); }
 
  private:
   ZQDBIndexBase* index_;
   bool backwards_;
   ZQString expression_;
+  // The definition compiled over the spoke's layout 0, whose fields it names.
+  ZQIndexDef def_;
+  bool unique_;
 };
 
 }  // namespace
@@ -93,6 +101,7 @@ ZQIndexWalk* ZQDbase::OpenIndexWalk(const char* name, ZQIndexDef* def) {
   ZQString expression;
   bool backwards = true;
   bool unique = false;
+  bool compact = false;
   if (IndexFamilyOf(VersionNumber) == IndexFamily::kDbase) {
     auto* mdx = static_cast<ZQDBMdx*>(index);
     expression = mdx->Expression();
@@ -102,9 +111,11 @@ ZQIndexWalk* ZQDbase::OpenIndexWalk(const char* name, ZQIndexDef* def) {
     auto* fox = static_cast<ZQDBFoxIndex*>(index);
     fox->Expression(expression);
     unique = fox->Unique();
+    compact = fox->Compact();
   }
   def->Name(name);
   def->Dups(!unique);
+  def->Compress(compact);
   // An expression beyond the grammar still walks; it has no segments then,
   // and its keys show as text.
   ZQString parsed(expression);
@@ -112,9 +123,10 @@ ZQIndexWalk* ZQDbase::OpenIndexWalk(const char* name, ZQIndexDef* def) {
   if (ZQDBIndexBase::ParseExpr(parsed, &compiled, OwnerSpoke())) {
     compiled.Name(name);
     compiled.Dups(!unique);
+    compiled.Compress(compact);
     *def = compiled;
   }
-  auto* walk = new (std::nothrow) IndexObjectWalk(index, backwards, expression.c_str());
+  auto* walk = new (std::nothrow) IndexObjectWalk(index, backwards, expression.c_str(), *def, unique);
   if (walk == nullptr) delete index;
   return walk;
 }
@@ -150,4 +162,67 @@ void ZQDbase::ReportIndexes(ZQString& text) {
     text += file;
     text += "\n";
   }
+}
+
+void IndexSegmentFields(const ZQIndexDef* def, ZQRecord& fields) {
+  fields.ClearFields();
+  for (int s = 0; s < def->SegCount(); ++s) fields.InstallField(s, (*def)[s].IdxField());
+}
+
+BATCHERR ZQDbase::BuildIndexes(const char* base, ZQIndexDef* const* defs) {
+  if (Table == nullptr || RecordBuffer == nullptr) return ZQ_NOT_OPEN;
+  IndexFamily family = IndexFamilyOf(VersionNumber);
+  if (family == IndexFamily::kNone)
+    return OwnerSpoke()->LogError(4, ZQ_NOT_SUPPORTED, lgettext(u"This dialect has no index files"));
+  int count = 0;
+  while (defs != nullptr && defs[count] != nullptr) ++count;
+  if (count == 0) return 0;
+  ZQDBIndexBase** made = new (std::nothrow) ZQDBIndexBase*[size_t(count)]();
+  if (made == nullptr) return ZQ_NO_MEMORY;
+  // The new CDX's own tag list: the first tag makes the file, the others
+  // join it.
+  ZQDBFoxIndex* tags = nullptr;
+  BATCHERR rc = 0;
+  ZQRecord fields;
+  for (int i = 0; i < count && rc == 0; ++i) {
+    IndexSegmentFields(defs[i], fields);
+    if (family == IndexFamily::kDbase)
+      made[i] = new (std::nothrow) ZQDBMdx(base, defs[i]->Name(), fields, defs[i]);
+    else
+      made[i] = new (std::nothrow) ZQDBFoxIndex(base, defs[i]->Name(), fields, *defs[i], tags);
+    fields.ClearFields();
+    if (made[i] == nullptr || !made[i]->OK()) {
+      ZQWString name;
+      name.Assign(defs[i]->Name(), 0, -1);
+      rc = OwnerSpoke()->LogError(4, ZQ_INDEX_ERROR, lgettext(u"Cannot create index %s"), name.c_str());
+    }
+  }
+  // Every live record in file order: its fields decoded into layout 0, whose
+  // fields the definitions' segments name, and its key added under its
+  // physical number, the number the files hold.
+  ZQRecord& layout = *OwnerSpoke()->GetLayout(0);
+  ZQString key;
+  for (int32_t n = 0; rc == 0; ++n) {
+    rc = GetRecord(layout, n, nullptr, false);
+    if (rc == ZQ_END) {
+      rc = 0;
+      break;
+    }
+    for (int i = 0; i < count && rc == 0; ++i) {
+      made[i]->BuildKey(key, defs[i]);
+      if (!made[i]->AddKey(key, CurrentPhysical))
+        rc = OwnerSpoke()->LogError(4, ZQ_WRITE_ERROR, lgettext(u"Got False from addkey %1$S, recno %2$d"),
+                                    key.c_str(), CurrentPhysical);
+    }
+    if (n == INT32_MAX - 1) break;
+  }
+  for (int i = 0; i < count; ++i) {
+    if (rc == 0 && family == IndexFamily::kFox && made[i] != nullptr &&
+        !static_cast<ZQDBFoxIndex*>(made[i])->Flush())
+      rc = OwnerSpoke()->LogError(4, ZQ_WRITE_ERROR, lgettext(u"Error writing index file"));
+    delete made[i];
+  }
+  delete[] made;
+  delete tags;
+  return rc;
 }

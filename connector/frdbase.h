@@ -36,6 +36,7 @@ class ZQ_EXPORT ZQFromDbase : public ZQImport {
   void ReportFacts(ZQString& text) const override;
   ZQIndexWalk* OpenIndexWalk(const char* name, ZQIndexDef* def) override { return dbase.OpenIndexWalk(name, def); }
   bool ParseIndexExpression(const char* text, ZQIndexDef* def) override;
+  BATCHERR BuildIndexes(const char* base, ZQIndexDef* const* defs) override { return dbase.BuildIndexes(base, defs); }
 
   // Read-only views for reports (`zqdb info`) and tests.
   const ZQDBFILE* TableHandle() const { return dbase.Table; }

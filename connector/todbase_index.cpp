@@ -23,12 +23,6 @@ bool BasePathOf(const char* path, char (&base)[4096]) {
   return true;
 }
 
-// The fields of a definition's segments, borrowed, in segment order.
-void CollectFields(const ZQIndexDef* def, ZQRecord& fields) {
-  fields.ClearFields();
-  for (int s = 0; s < def->SegCount(); ++s) fields.InstallField(s, (*def)[s].IdxField());
-}
-
 int CountOf(ZQIndexDef* const* list) {
   int n = 0;
   while (list != nullptr && list[n] != nullptr) ++n;
@@ -65,7 +59,7 @@ BATCHERR ZQToDbase::OpenIndexes(const char* path) {
   if (IndexObjects == nullptr) return ZQ_NO_MEMORY;
   ZQRecord fields;
   for (int i = 0; i < count; ++i) {
-    CollectFields(list[i], fields);
+    IndexSegmentFields(list[i], fields);
     ZQDBIndexBase* index = dbase.OpenIndex(base, list[i]->Name());
     IndexObjects[i] = index;
     if (index == nullptr || !index->OK()) return IndexFailed("open", list[i]);
@@ -92,7 +86,7 @@ BATCHERR ZQToDbase::CreateIndexes(const char* path) {
   if (IndexObjects == nullptr) return ZQ_NO_MEMORY;
   ZQRecord fields;
   for (int i = 0; i < count; ++i) {
-    CollectFields(list[i], fields);
+    IndexSegmentFields(list[i], fields);
     ZQDBIndexBase* index = dbase.CreateIndex(base, fields, list[i]);
     IndexObjects[i] = index;
     if (index == nullptr || !index->OK()) return IndexFailed("create", list[i]);

@@ -12,6 +12,7 @@
 #include <string>
 #include <vector>
 
+#include "engine/check.h"
 #include "engine/convert.h"
 #include "engine/dbf_source.h"
 #include "engine/indexes.h"
@@ -63,7 +64,9 @@ const OptionHelp kOptionHelp[] = {
     {"csv-codepage", "  --csv-codepage N         the CSV source's own code page (default UTF-8)\n"},
     {"index", "  --index NAME=EXPR        convert: make the new table with this index (repeatable); NAME is a tag\n"
               "                           of the table's MDX or CDX file, or a path ending in .ndx or .idx\n"
-              "  --index NAME             keys: the index to walk (a tag or an .ndx/.idx path)\n"},
+              "  --index NAME             keys: the index to walk (a tag or an .ndx/.idx path); check: an .ndx/.idx\n"
+              "                           file to check beside the table's tags; reindex: the index to rebuild\n"
+              "                           (all the table's tags when none is named), or with =EXPR one to add\n"},
     {"unique-index", "  --unique-index NAME=EXPR the same, for an index without duplicates\n"},
     {"index-form", "  --index-form plain       IDX files without compact keys (default compact)\n"},
     {"seek", "  --seek KEY               start at the first key not less than KEY\n"},
@@ -88,6 +91,7 @@ struct Args {
   int codepage = kCodePageUnset, from_codepage = kCodePageUnset, to_codepage = kCodePageUnset;
   std::vector<std::string> fields;  // --fields
   std::string read_table;           // --table
+  std::vector<std::string> index_names;  // every --index NAME (check, reindex)
 };
 
 int Usage(const std::string& message) {
@@ -199,6 +203,7 @@ int ParseArgs(int argc, char** argv, Args* args) {
       size_t at = v.find('=');
       if (at == std::string::npos && a == "--index") {
         args->keys.index = v;
+        args->index_names.push_back(v);
       } else {
         if (at == std::string::npos || at == 0 || at + 1 == v.size())
           return Usage(a + " takes NAME=EXPR, not " + v);
@@ -283,22 +288,11 @@ std::string CodePageLine(const CodePageChoice& c) {
   return page + " (" + c.origin + (c.driver >= 0 ? std::string("; ") + driver : "") + ")";
 }
 
-// The facts a spoke reports, as name and value.
-std::vector<std::pair<std::string, std::string>> Facts(const ZQSpoke* spoke) {
-  ZQString text;
-  spoke->ReportFacts(text);
-  std::vector<std::pair<std::string, std::string>> facts;
-  std::string all(text.c_str(), size_t(text.length()));
-  size_t start = 0;
-  while (start < all.size()) {
-    size_t nl = all.find('\n', start);
-    std::string line = all.substr(start, nl == std::string::npos ? std::string::npos : nl - start);
-    size_t colon = line.find(": ");
-    if (colon != std::string::npos) facts.emplace_back(line.substr(0, colon), line.substr(colon + 2));
-    if (nl == std::string::npos) break;
-    start = nl + 1;
-  }
-  return facts;
+const char* DialectName(int dialect) {
+  static const char* const kNames[] = {"dBASE II", "dBASE III+", "dBASE IV", "Enable", "dBASE III", "(no name)",
+                                       "FoxPro", "Enable OA (Database)", "Clipper", "Visual dBASE 5.5",
+                                       "Visual FoxPro"};
+  return dialect >= 0 && dialect <= 10 ? kNames[dialect] : "?";
 }
 
 std::vector<std::string> SplitTabs(const std::string& s) {
@@ -442,7 +436,7 @@ int CmdInfo(const Args& args) {
   }
   t.codepage = codepage;
   t.codepage_line = CodePageLine(codepage);
-  for (const auto& f : Facts(spoke.get())) {
+  for (const auto& f : SpokeFacts(spoke.get())) {
     const std::string& k = f.first;
     if (k == "version") t.version = f.second;
     else if (k == "records") t.records = f.second;
@@ -609,6 +603,25 @@ int CmdConvert(const Args& args) {
 
 int CmdHelp(const Args& args);
 
+int CmdCheck(const Args& args) {
+  if (args.files.size() != 1) return Usage("check takes one table");
+  if (!args.convert.write.table.indexes.empty()) return Usage("check takes --index FILE, without =EXPR");
+  if (!args.format.empty() && args.format != "text" && args.format != "json")
+    return Usage("check --format takes text or json, not " + args.format);
+  CheckRunOptions opts;
+  opts.indexes = args.index_names;
+  opts.json = args.format == "json";
+  return RunCheck(args.files[0], args.source, opts);
+}
+
+int CmdReindex(const Args& args) {
+  if (args.files.size() != 1) return Usage("reindex takes one table");
+  ReindexOptions opts;
+  opts.names = args.index_names;
+  opts.added = args.convert.write.table.indexes;
+  return RunReindex(args.files[0], args.source, opts);
+}
+
 // The commands. A new one is a function and a row.
 struct Command {
   const char* name;
@@ -648,6 +661,14 @@ const Command kCommands[] = {
     {"formats", "formats", "the connector definitions of the modules found", CmdFormats, false, "modules",
      "zqdb formats\n"},
     {"help", "help [COMMAND]", "this text, or a command's usage with examples", CmdHelp, false, "", "zqdb help convert\n"},
+    {"check", "check TABLE", "what is damaged in a table, its memo file and its indexes", CmdCheck, true,
+     ZQ_TABLE_OPTIONS "format index",
+     "zqdb check customers.dbf\n"
+     "zqdb check customers.dbf --index byname.ndx --format json\n"},
+    {"reindex", "reindex TABLE", "the table's indexes built anew from its records", CmdReindex, true,
+     ZQ_TABLE_OPTIONS "index unique-index",
+     "zqdb reindex customers.dbf\n"
+     "zqdb reindex customers.dbf --index CITY=CITY+NAME\n"},
 };
 
 #undef ZQ_TABLE_OPTIONS

@@ -7,6 +7,7 @@
 #include <memory>
 #include <string>
 
+#include "engine/check.h"
 #include "engine/dbf_source.h"
 #include "engine/aliases.h"
 #include "engine/field_plan.h"
@@ -120,5 +121,18 @@ int RunConvert(const std::string& src, const std::string& named, const ConvertOp
   if (opts.write.mode == 2)
     fprintf(stderr, "zqdb: %lld records updated, %lld added\n", static_cast<long long>(counts.updated),
             static_cast<long long>(counts.added));
+  if (opts.write.mode == 2 && counts.updated > 0 && &to == FindEndpoint("dbf")) {
+    // A record replaced in place gets its new key beside the old one in each
+    // tag, and the old key would go on finding it: the tags are built again
+    // from the records.
+    SourceOptions table;
+    table.type = opts.write.table.type;
+    table.dialect = opts.write.table.dialect;
+    table.codepage = opts.write.table.codepage;
+    std::string rebuilt;
+    if (!RebuildTags(dst, table, &rebuilt, &error))
+      return Fail("the records are written, but the indexes could not be rebuilt: " + error);
+    if (!rebuilt.empty()) fprintf(stderr, "zqdb: %s (an update leaves each replaced record's old key behind)\n", rebuilt.c_str());
+  }
   return 0;
 }

@@ -404,3 +404,26 @@ BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePt
 bool OpenTableSource(const std::string& path, const ReadOptions& opts, SourcePtr* out, std::string* error) {
   return OpenSource(path, opts.table, out, error) == 0;
 }
+
+std::vector<std::pair<std::string, std::string>> SpokeFacts(const ZQSpoke* spoke) {
+  ZQString text;
+  spoke->ReportFacts(text);
+  std::vector<std::pair<std::string, std::string>> facts;
+  std::string all(text.c_str(), size_t(text.length()));
+  size_t start = 0;
+  while (start < all.size()) {
+    size_t nl = all.find('\n', start);
+    std::string line = all.substr(start, nl == std::string::npos ? std::string::npos : nl - start);
+    size_t colon = line.find(": ");
+    if (colon != std::string::npos) facts.emplace_back(line.substr(0, colon), line.substr(colon + 2));
+    if (nl == std::string::npos) break;
+    start = nl + 1;
+  }
+  return facts;
+}
+
+std::string SpokeFact(const std::vector<std::pair<std::string, std::string>>& facts, const char* name) {
+  for (const auto& f : facts)
+    if (f.first == name) return f.second;
+  return "";
+}

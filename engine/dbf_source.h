@@ -6,6 +6,8 @@
 
 #include <cstdint>
 #include <string>
+#include <utility>
+#include <vector>
 
 #include "engine/codepages.h"
 #include "engine/modules.h"
@@ -67,6 +69,10 @@ std::string ExplainTableError(const std::string& path, const std::string& messag
 
 // One warning line when records of the open table `spoke` lie past 2 GiB.
 void WarnOutOfReach(const std::string& path, const ZQSpoke* spoke);
+// The "name: value" facts a spoke reports (ReportFacts), in their order.
+std::vector<std::pair<std::string, std::string>> SpokeFacts(const ZQSpoke* spoke);
+// The value of the first fact `name`, or "".
+std::string SpokeFact(const std::vector<std::pair<std::string, std::string>>& facts, const char* name);
 
 // Opens `path`; on failure `error` holds the spoke's message and the result
 // is the spoke's code (non-zero). `chosen`, when given, tells how the code

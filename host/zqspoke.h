@@ -192,6 +192,19 @@ class ZQIndexWalk {
   virtual const char* Expression() const = 0;
   // True when the last walk ended at damage rather than at its last key.
   virtual bool Broken() const { return false; }
+  // For check: the key this index gives the record now in the spoke's
+  // layout 0, built as the index kind builds the keys it adds.
+  virtual void BuildKey(ZQString& key) { key = ""; }
+  // Whether the index keeps one record per key.
+  virtual bool Unique() const { return false; }
+  // For check: walks every block of the tree from the root, bounded by the
+  // file's size, and appends a line "block N: what is wrong" for each fault
+  // of structure (levels, sibling links, counts, keys out of order within a
+  // block, a block reached twice). The number of faults.
+  virtual int32_t CheckTree(ZQString& findings) {
+    (void)findings;
+    return 0;
+  }
 };
 
 // The base of every spoke.
@@ -310,6 +323,18 @@ class ZQImport : public ZQSpoke {
     (void)name;
     (void)def;
     return nullptr;
+  }
+
+  // This engine's own addition: builds the indexes `defs` (NULL-ended;
+  // names are tags, or index files' paths with their extension) anew for the
+  // open table, beside `base` (a path without extension, where the new tags'
+  // file goes): the key of every live record, with its physical record
+  // number. Index files of those names must not exist yet. 0, or the error
+  // code with the message logged.
+  virtual BATCHERR BuildIndexes(const char* base, ZQIndexDef* const* defs) {
+    (void)base;
+    (void)defs;
+    return ZQ_NOT_SUPPORTED;
   }
 
   // Called after the target or the options changed, with no table open; the

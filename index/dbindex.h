@@ -49,6 +49,13 @@ class ZQ_EXPORT ZQDBIndexBase {
   // True when the last walk ended at damage (a block that couldn't be read,
   // a walk longer than the file can hold) rather than at its last key.
   bool Broken() const;
+  // Walks every block of the tree from the root and appends a line
+  // "block N: what is wrong" to `findings` for each fault of structure. The
+  // number of faults; 0 for kinds that have no such walk.
+  virtual int32_t CheckTree(ZQString& findings) {
+    (void)findings;
+    return 0;
+  }
 
   static const char* GetToken(const char* p, ZQString& token);
   static bool ParseExpr(ZQString& expression, ZQIndexDef* def, ZQSpoke* spoke);

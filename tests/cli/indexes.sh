@@ -65,10 +65,12 @@ expect_run 0 convert more.csv p.dbf --mode append --no-progress
 expect_run 0 keys p.dbf --index NAME && expect_out "abe,5"
 expect_run 0 keys p.dbf --index BYC && expect_out "LIMA abe,5"
 
-# --- Update: the new key goes in, the old one stays ----------------------------
+# --- Update: the tags are rebuilt, so the old key is gone ------------------------
 printf 'NAME,CITY,QTY\nzed,ROME,3\n' >upd.csv
-expect_run 0 convert upd.csv p.dbf --mode update --key QTY --no-progress
-expect_run 0 keys p.dbf --index NAME && expect_out "bob,1" && expect_out "zed,1"
+expect_run 0 convert upd.csv p.dbf --mode update --key QTY --no-progress && err_has "2 indexes of p.dbf rebuilt: NAME BYC"
+expect_run 0 keys p.dbf --index NAME && expect_out "zed,1"
+if grep -q "bob,1" "$OUT"; then fail "the old key of an updated record is still there"; else PASSED=$((PASSED + 1)); fi
+expect_run 0 check p.dbf
 
 # --- Refused definitions ------------------------------------------------------
 expect_run 2 convert people.csv x.dbf --index NAME --no-progress && expect_err "zqdb: --index takes NAME=EXPR"

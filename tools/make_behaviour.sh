@@ -10,7 +10,7 @@ cd "$(dirname "$0")/.."
   echo "case, why, and the test that shows it. The rule behind all of them: no data lost,"
   echo "no file left that other programs can't read, and bad input answered with a clear"
   echo "error, never a crash or a hang."
-  for f in host read memo target vfp dbase_index fox_index engine safeguards safety cli databases module; do
+  for f in host read memo target vfp dbase_index fox_index check engine safeguards safety cli databases module; do
     [ -f "docs/notes/$f.md" ] || continue
     echo
     sed 's/^# /## /' "docs/notes/$f.md"

@@ -121,4 +121,46 @@ expect_run 0 convert more.csv c.dbf --to clipper --no-progress
 expect_run 0 convert more.csv c.dbf --mode append --no-progress
 err_has "c.dbf has index files (.ntx) that this dialect doesn't keep: they will be out of date"
 
+# --- check: one thing damaged at a time is found and named; reindex mends keys --
+printf 'NAME,BORN,QTY,NOTE\nbob,2001-02-03,3,hello\nann,1999-12-31,1,a longer note\ncid,2000-02-29,2,x\n' >d.csv
+expect_run 0 convert d.csv d.dbf --schema "NAME C(10), BORN D, QTY N(5,0), NOTE M" --index name=NAME --no-progress
+expect_run 0 check d.dbf && expect_out "d.dbf: clean (3 records, the memo file, 1 index)"
+# name | python patch of the bytes b (header length h, record length r) | what check says
+while IFS='|' read -r name patch says; do
+  cp d.dbf x.dbf && cp d.dbt x.dbt && cp d.mdx x.mdx
+  python3 -c "
+import struct
+b = bytearray(open('x.dbf', 'rb').read()); h, r = struct.unpack('<HH', b[8:12])
+$patch
+open('x.dbf', 'wb').write(b)"
+  expect_run 1 check x.dbf
+  if grep -qF -- "$says" "$OUT"; then PASSED=$((PASSED + 1)); else fail "$name: check lacks '$says': $(head -c 400 "$OUT")"; fi
+done <<'CASES'
+key|b[h + r + 1] = ord('z')|index NAME: record 2: key 'ann' differs from 'znn'
+flag|b[h + 2 * r] = ord('X')|delete flag 0x58 is neither blank nor
+deleted|b[h + 2 * r] = ord('*')|index NAME: record 3: key 'cid' names a deleted record
+date|b[h + 11:h + 19] = b'20011399'|BORN '20011399' has no month 1-12
+number|b[h + 19:h + 24] = b'  1x2'|QTY '  1x2' is no number
+short|del b[-r // 2:]|the header counts 3 records, the file holds 2 whole ones
+extra|b[4] -= 1|bytes stand behind the last of the header's 2 records
+memo|b[h + 34:h + 34] = b''; b[h + 24:h + 34] = b'       999'|block 999 lies past the end of the memo file
+shared|b[h + r + 24:h + r + 34] = b[h + 24:h + 34]|shares block 1 with the memo of record 1
+CASES
+cp d.dbt x.dbt && cp d.mdx x.mdx && cp d.dbf x.dbf
+printf '\x01\0\0\0' | dd of=x.dbt bs=1 seek=0 conv=notrunc 2>/dev/null
+expect_run 1 check x.dbf --format json && expect_out '"part": "memo", "record": 3' && expect_out "next free block 1 lies below"
+# A record appended by a program that keeps no index (its bytes added by hand).
+python3 -c "
+import struct
+b = bytearray(open('d.dbf', 'rb').read()); h, r = struct.unpack('<HH', b[8:12]); n = struct.unpack('<I', b[4:8])[0]
+rec = b' ' + b'dan'.ljust(10) + b'20200101' + b'    4' + b' ' * 10
+b[h + n * r:] = rec + b'\x1a'; b[4:8] = struct.pack('<I', n + 1)
+open('d.dbf', 'wb').write(b)"
+expect_run 1 check d.dbf && expect_out "index NAME: record 4: has no key in the index"
+expect_run 0 reindex d.dbf && err_has "1 index of d.dbf rebuilt: NAME"
+expect_run 0 check d.dbf && expect_out "clean"
+expect_run 0 keys d.dbf --index NAME && expect_out "dan,4"
+expect_run 0 reindex d.dbf --unique-index up=NAME && expect_run 0 keys d.dbf --index UP && expect_out "dan,4"
+expect_run 2 check d.dbf --format table
+
 finish

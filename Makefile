@@ -41,8 +41,10 @@ demo: build
 	$(BUILD)/zqdb cat examples/customers.dbf --codepage 850 --format table
 	@echo
 	@mkdir -p $(BUILD)/demo
-	$(BUILD)/zqdb convert examples/customers.dbf $(BUILD)/demo/customers.dbf --to foxpro --codepage 850 --no-progress
+	$(BUILD)/zqdb convert examples/customers.dbf $(BUILD)/demo/customers.dbf --to foxpro --codepage 850 \
+	  --index city=CITY+NAME --no-progress
 	$(BUILD)/zqdb info $(BUILD)/demo/customers.dbf --type foxpro
+	$(BUILD)/zqdb keys $(BUILD)/demo/customers.dbf --index CITY --format jsonl | head -n 3
 	$(BUILD)/zqdb convert $(BUILD)/demo/customers.dbf $(BUILD)/demo/customers.jsonl --codepage 850 --no-progress
 	head -n 3 $(BUILD)/demo/customers.jsonl
 

@@ -326,10 +326,7 @@ void ApplyOptionText(ZQSpoke* spoke, const std::string& text) {
   spoke->SetOption(text.substr(0, eq).c_str(), text.substr(eq + 1).c_str());
 }
 
-namespace {
-
-// The number of a "name: value" line of a spoke's facts, or -1.
-int64_t Fact(const std::string& all, const char* name) {
+int64_t FactNumber(const std::string& all, const char* name) {
   std::string key = std::string(name) + ": ";
   for (size_t at = 0; at < all.size();) {
     if (all.compare(at, key.size(), key) == 0) return strtoll(all.c_str() + at + key.size(), nullptr, 10);
@@ -340,15 +337,14 @@ int64_t Fact(const std::string& all, const char* name) {
   return -1;
 }
 
-}  // namespace
-
 void WarnOutOfReach(const std::string& path, const ZQSpoke* spoke) {
   // Record positions are 32-bit offsets, the file format's own limit: a
   // record that ends past 2 GiB can't be read.
   ZQString text;
   spoke->ReportFacts(text);
   std::string facts(text.c_str(), size_t(text.length()));
-  int64_t count = Fact(facts, "records"), header = Fact(facts, "header"), record = Fact(facts, "record");
+  int64_t count = FactNumber(facts, "records"), header = FactNumber(facts, "header"),
+          record = FactNumber(facts, "record");
   if (count <= 0 || header < 0 || record <= 0 || header + count * record <= INT32_MAX) return;
   int64_t reachable = header > INT32_MAX ? 0 : (int64_t{INT32_MAX} - header) / record;
   Warn(path + ": " + std::to_string(count - reachable) + " of its " + std::to_string(count) +

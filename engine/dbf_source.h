@@ -69,6 +69,8 @@ std::string ExplainTableError(const std::string& path, const std::string& messag
 
 // One warning line when records of the open table `spoke` lie past 2 GiB.
 void WarnOutOfReach(const std::string& path, const ZQSpoke* spoke);
+// The number of a "name: value" line of a spoke's facts, or -1.
+int64_t FactNumber(const std::string& facts, const char* name);
 // The "name: value" facts a spoke reports (ReportFacts), in their order.
 std::vector<std::pair<std::string, std::string>> SpokeFacts(const ZQSpoke* spoke);
 // The value of the first fact `name`, or "".

@@ -1,5 +1,6 @@
 #include "engine/table_output.h"
 
+#include "engine/dbf_source.h"
 #include "engine/report.h"
 #include "host/journal.h"
 
@@ -14,19 +15,6 @@
 #include <cstring>
 
 namespace {
-
-// The number of a "name: value" line of a spoke's facts, or -1.
-int64_t FactNumber(const ZQString& facts, const char* name) {
-  std::string all(facts.c_str(), size_t(facts.length()));
-  std::string key = std::string(name) + ": ";
-  for (size_t at = 0; at < all.size();) {
-    if (all.compare(at, key.size(), key) == 0) return strtoll(all.c_str() + at + key.size(), nullptr, 10);
-    size_t nl = all.find('\n', at);
-    if (nl == std::string::npos) break;
-    at = nl + 1;
-  }
-  return -1;
-}
 
 // The owner's process id of a scratch entry named ".zqdb-PID-...", or 0.
 pid_t StagingOwner(const char* name) {
@@ -63,8 +51,9 @@ bool VerifyTable(const std::string& path, const TableConnector& c, const std::st
   // Where the end mark stands: header length plus count times record length.
   int64_t end = -1;
   if (rc == 0) {
-    ZQString facts;
-    check->ReportFacts(facts);
+    ZQString text;
+    check->ReportFacts(text);
+    std::string facts(text.c_str(), size_t(text.length()));
     int64_t header = FactNumber(facts, "header"), record = FactNumber(facts, "record");
     if (header >= 0 && record >= 0 && count >= 0) end = header + count * record;
   }

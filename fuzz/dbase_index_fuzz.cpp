@@ -10,25 +10,11 @@
 #include <cstring>
 #include <string>
 
+#include "fuzz/scratch_file.h"
+
 #include "index/mdx.h"
 
 namespace {
-
-const std::string& Dir() {
-  static const std::string dir = [] {
-    std::string d = "/tmp/zqdbse-indexfuzz-" + std::to_string(getpid());
-    mkdir(d.c_str(), 0700);
-    return d;
-  }();
-  return dir;
-}
-
-bool Write(const std::string& path, const uint8_t* data, size_t size) {
-  FILE* f = fopen(path.c_str(), "wb");
-  if (f == nullptr) return false;
-  bool ok = fwrite(data, 1, size, f) == size;
-  return fclose(f) == 0 && ok;
-}
 
 void Exercise(ZQDBMdx& ix, bool backwards) {
   if (!ix.OK()) return;
@@ -53,9 +39,9 @@ void Exercise(ZQDBMdx& ix, bool backwards) {
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   if (size < 1 || size > (1u << 20)) return 0;
   bool mdx = data[0] & 1;
-  std::string base = Dir() + "/t";
+  std::string base = fuzz::ScratchDir("indexfuzz") + "/t";
   std::string path = mdx ? base + ".mdx" : base + ".ndx";
-  if (!Write(path, data + 1, size - 1)) return 0;
+  if (!fuzz::WriteScratch(path, data + 1, size - 1)) return 0;
   if (mdx) {
     // The first tag's name, as the file gives it.
     char name[12] = "NAME";

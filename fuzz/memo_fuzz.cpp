@@ -8,6 +8,8 @@
 #include <cstdint>
 #include <cstdio>
 #include <string>
+
+#include "fuzz/scratch_file.h"
 #include <sys/stat.h>
 
 #include "table/dbf.h"
@@ -27,22 +29,6 @@ constexpr Kind kKinds[] = {
     {0xE5, DIALECT_CLIPPER, "smt"},
 };
 
-const std::string& Dir() {
-  static const std::string dir = [] {
-    std::string d = "/tmp/zqdbse-memofuzz-" + std::to_string(getpid());
-    mkdir(d.c_str(), 0700);
-    return d;
-  }();
-  return dir;
-}
-
-bool Write(const std::string& path, const uint8_t* data, size_t size) {
-  FILE* f = fopen(path.c_str(), "wb");
-  if (f == nullptr) return false;
-  bool ok = size == 0 || fwrite(data, 1, size, f) == size;
-  return fclose(f) == 0 && ok;
-}
-
 // A wide table with one memo field and no records.
 bool WriteTable(const std::string& path, uint8_t version) {
   uint8_t t[66] = {};
@@ -54,7 +40,7 @@ bool WriteTable(const std::string& path, uint8_t version) {
   t[32 + 11] = 'M';
   t[32 + 16] = 10;
   t[64] = 0x0D;
-  return Write(path, t, sizeof t);
+  return fuzz::WriteScratch(path, t, sizeof t);
 }
 
 }  // namespace
@@ -63,9 +49,9 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   if (size < 3 || size > (1u << 20)) return 0;
   const Kind& kind = kKinds[data[0] % 4];
   uint32_t seed = uint32_t(data[1]) | uint32_t(data[2]) << 8;
-  std::string table = Dir() + "/t.dbf";
-  std::string memo = Dir() + "/t." + kind.ext;
-  if (!WriteTable(table, kind.version) || !Write(memo, data + 3, size - 3)) return 0;
+  std::string table = fuzz::ScratchDir("memofuzz") + "/t.dbf";
+  std::string memo = fuzz::ScratchDir("memofuzz") + "/t." + kind.ext;
+  if (!WriteTable(table, kind.version) || !fuzz::WriteScratch(memo, data + 3, size - 3)) return 0;
 
   ZQDBFIELD* fields[kMaxFields] = {};
   int dialect = kind.dialect;

@@ -12,6 +12,7 @@
 #include <cstring>
 
 #include "engine/endpoints.h"
+#include "engine/raw_table.h"
 #include "engine/report.h"
 #include "engine/text_types.h"
 #include "host/zqutil.h"
@@ -214,9 +215,11 @@ std::string ExplainTableError(const std::string& path, const std::string& messag
     return why.empty() ? message : message + ": " + why;
   }
   if (StartsWith(message, "Could not open memo file") || StartsWith(message, "Memo problem")) {
-    std::string memo = MemoFileOf(path);
-    std::string why = access(memo.c_str(), R_OK) != 0 ? std::string(": ") + strerror(errno) : "";
-    return message + " (" + memo + why + ")";
+    std::string memo, kind;
+    std::string why = MemoFileTrouble(path, &memo, &kind);
+    if (memo.empty()) memo = MemoFileOf(path);
+    return message + " (" + memo + (kind.empty() ? "" : ", a " + kind + " memo file") + (why.empty() ? "" : ": " + why) +
+           ")";
   }
   return message;
 }
@@ -283,6 +286,61 @@ void HoldAllFields(ZQSpoke* spoke, const std::string& path, bool chosen_by_user)
     return;
   }
   Warn(has + ": the last " + std::to_string(count - limit) + " are left out");
+}
+
+// Under --memo errors the module leaves a memo it can't read blank without
+// a word: when the memo file was refused, every memo of the table; when it
+// opened, a memo whose block lies beyond the 32-bit offsets the file is
+// read by. zqdb reads the pointers itself and says once how many memos are
+// left blank and why. A table is read more than once by some runs: one line
+// for each table.
+void WarnBlankMemos(const std::string& path, const ZQSpoke* spoke) {
+  static std::vector<std::string> told;
+  for (const std::string& t : told)
+    if (t == path) return;
+  auto facts = SpokeFacts(spoke);
+  const std::string memo_fact = SpokeFact(facts, "memo");
+  if (memo_fact.empty() || memo_fact == "none") return;
+  const bool refused = atoi(SpokeFact(facts, "memo block").c_str()) == 0;
+  const int64_t block_size = refused ? 0 : atoll(SpokeFact(facts, "memo block").c_str());
+  const bool smt = SpokeFact(facts, "memo kind") == "Clipper SMT";
+  const bool vfp = SpokeFact(facts, "version") == "0x30" || SpokeFact(facts, "version") == "0x31" ||
+                   SpokeFact(facts, "version") == "0xB0";
+  const int64_t hdrlen = atoll(SpokeFact(facts, "header").c_str());
+  const int64_t reclen = atoll(SpokeFact(facts, "record").c_str());
+  const int64_t count = atoll(SpokeFact(facts, "records").c_str());
+  std::vector<RawField> memos;
+  for (const RawField& f : RawFieldsOf(facts))
+    if ((f.type == 'M' || f.type == 'G' || (f.type == 'B' && !vfp)) && f.offset + f.width < reclen) memos.push_back(f);
+  if (memos.empty() || reclen <= 0) return;
+  FILE* table = fopen(path.c_str(), "rb");
+  if (table == nullptr) return;
+  std::vector<char> rec(static_cast<size_t>(reclen));
+  int64_t blank = 0, first_record = 0;
+  std::string first_field;
+  if (fseeko(table, hdrlen, SEEK_SET) == 0) {
+    for (int64_t r = 0; r < count && fread(rec.data(), 1, rec.size(), table) == rec.size(); ++r) {
+      if (rec[0] != ' ') continue;  // deleted records are not read
+      for (const RawField& f : memos) {
+        int64_t length, block = MemoBlockOf(rec.data() + 1 + f.offset, f.width, vfp, smt, &length);
+        if (block <= 0 || (smt && length == 0)) continue;
+        if (!refused && block * block_size <= INT32_MAX) continue;
+        if (blank++ == 0) first_record = r + 1, first_field = f.name;
+      }
+    }
+  }
+  fclose(table);
+  told.push_back(path);
+  if (blank == 0) return;
+  std::string memo, kind, why = MemoFileTrouble(path, &memo, &kind);
+  std::string line = std::to_string(blank) + (blank == 1 ? " memo was" : " memos were") +
+                     " left blank under --memo errors (the first: record " + std::to_string(first_record) + ", " +
+                     first_field + "): ";
+  if (refused)
+    line += memo + ", a " + kind + " memo file, could not be read" + (why.empty() ? "" : ": " + why);
+  else
+    line += "their blocks lie beyond the 2 GiB that " + SpokeFact(facts, "memo file") + " can be read to";
+  Warn(line);
 }
 
 }  // namespace
@@ -393,6 +451,7 @@ BATCHERR OpenSource(const std::string& path, const SourceOptions& opts, SourcePt
   }
   TypeMemoColumns(spoke.get());
   WarnOutOfReach(path, spoke.get());
+  if (opts.memo_policy == 1) WarnBlankMemos(path, spoke.get());
   *out = std::move(spoke);
   return 0;
 }

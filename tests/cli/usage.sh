@@ -48,7 +48,15 @@ printf '\x00%.0s' {1..20} >>memo.dbf
 printf 'NOTE\x00\x00\x00\x00\x00\x00\x00M\x00\x00\x00\x00\x0a\x00' >>memo.dbf
 printf '\x00%.0s' {1..14} >>memo.dbf
 printf '\x0d          1\x1a' >>memo.dbf
-expect_run 1 cat memo.dbf && expect_err "(memo.dbt: No such file or directory)"
+expect_run 1 cat memo.dbf && expect_err "(memo.dbt, a dBASE III memo file: No such file or directory)"
+# --memo errors reads on without the memo file and counts what it left blank.
+expect_run 0 cat memo.dbf --memo errors && expect_err "zqdb: warning: 1 memo was left blank under --memo errors (the first: record 1, NOTE): memo.dbt, a dBASE III memo file, could not be read: No such file or directory"
+# A dBASE IV memo file without its version word (Perl XBase writes these).
+printf 'NOTE\nsome text\n' >note.csv
+"$ZQDB" convert note.csv db4.dbf --schema "NOTE M" --to 2 2>/dev/null
+printf '\0\0' | dd of=db4.dbt bs=1 seek=18 conv=notrunc 2>/dev/null
+expect_run 1 cat db4.dbf && expect_err "(db4.dbt, a dBASE IV memo file: its header's version word is 0x0000, not 0x0101 or 0x0102)"
+expect_run 0 cat db4.dbf --memo errors && expect_err "1 memo was left blank under --memo errors (the first: record 1, NOTE): db4.dbt, a dBASE IV memo file, could not be read: its header's version word is 0x0000"
 
 # --- Warnings: one line a kind, --quiet, --strict -----------------------------
 printf 'id,name,qty\n1,ann,2\n' >lower.csv

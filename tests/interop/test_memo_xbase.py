@@ -78,7 +78,12 @@ with workdir() as d:
             s.check("dBASE IV version byte", f.read(1)[0] == 0x8B)
         rc, _, err = run([ZQDB, "cat", db4, "--format", "jsonl"])
         s.check("dBASE IV DBT without version word refused",
-                rc == 1 and "Could not open memo file, or wrong version" in err, "exit %d: %s" % (rc, err))
+                rc == 1 and "Could not open memo file, or wrong version (" in err and
+                ", a dBASE IV memo file: its header's version word is 0x0000" in err, "exit %d: %s" % (rc, err))
+        rc, _, err = run([ZQDB, "cat", db4, "--memo", "errors"])
+        blank = sum(1 for m in MEMOS if m)
+        s.check("--memo errors counts the memos left blank",
+                rc == 0 and ("%d memos were left blank under --memo errors" % blank) in err, "exit %d: %s" % (rc, err))
         s.compare_table("dBASE IV DBT ignored", db4, ["--memo", "errors"], "ascii",
                         ref_fix=lambda k, v: None if k == "NOTE" else v, expect_live=4)
         # With the version word of a dBASE IV memo file, 0x0101, the memos read.

@@ -19,6 +19,7 @@
 
 #include "engine/indexes.h"
 #include "engine/outbuf.h"
+#include "engine/raw_table.h"
 #include "engine/report.h"
 #include "engine/writers.h"
 #include "host/endian.h"
@@ -107,12 +108,7 @@ int64_t FileSize(int fd) {
   return fstat(fd, &st) == 0 ? int64_t(st.st_size) : -1;
 }
 
-struct FieldDesc {
-  std::string name;
-  char type;
-  int32_t offset;  // within the record, behind the flag byte
-  int32_t width;
-};
+using FieldDesc = RawField;
 
 // ---------------------------------------------------------------------------
 // Values, as the module reads them: blanks are no value in every type, a
@@ -211,26 +207,10 @@ class MemoCheck {
 
   // The pointer bytes of one memo field of live record `record` (from 1).
   void Pointer(int64_t record, const FieldDesc& f, const char* p) {
-    int64_t block = 0, length = -1;
-    if (vfp_ && f.width == 4) {
-      block = GetLe32(reinterpret_cast<const uint8_t*>(p));
-    } else if (kind_ == MEMO_SMT && f.width == kSmtPtrSize) {
-      length = GetLe32(reinterpret_cast<const uint8_t*>(p) + kSmtPtrLength);
-      block = GetLe32(reinterpret_cast<const uint8_t*>(p) + kSmtPtrBlock);
-    } else {
-      int32_t i = 0, n = f.width;
-      while (i < n && p[i] == ' ') ++i;
-      while (n > i && (p[n - 1] == ' ' || p[n - 1] == '\0')) --n;
-      for (int32_t k = i; k < n; ++k) {
-        if (p[k] < '0' || p[k] > '9') {
-          findings_->Record("memo", record, f.name + ": pointer " + Shown(p, size_t(f.width)) + " is no block number");
-          return;
-        }
-        block = block * 10 + (p[k] - '0');
-        if (block > INT32_MAX) break;
-      }
-    }
-    if (block == 0) return;
+    int64_t length, block = MemoBlockOf(p, f.width, vfp_, kind_ == MEMO_SMT, &length);
+    if (block < 0)
+      findings_->Record("memo", record, f.name + ": pointer " + Shown(p, size_t(f.width)) + " is no block number");
+    if (block <= 0) return;
     Memo(record, f, block, length);
   }
 
@@ -548,19 +528,8 @@ int RunCheck(const std::string& table, const SourceOptions& source, const CheckR
   const int64_t header_count = atoll(SpokeFact(facts, "records").c_str());
   const int64_t hdrlen = atoll(SpokeFact(facts, "header").c_str());
   const int64_t reclen = atoll(SpokeFact(facts, "record").c_str());
-  std::vector<FieldDesc> fields;
-  int32_t offset = 0;
-  for (const auto& f : facts) {
-    if (f.first != "field") continue;
-    // name, letter, width, decimals, separated by tabs
-    size_t a = f.second.find('\t');
-    if (a == std::string::npos || a + 1 >= f.second.size()) continue;
-    size_t b = f.second.find('\t', a + 1);
-    if (b == std::string::npos) continue;
-    FieldDesc d{f.second.substr(0, a), f.second[a + 1], offset, atoi(f.second.c_str() + b + 1)};
-    offset += d.width;
-    fields.push_back(d);
-  }
+  const std::vector<FieldDesc> fields = RawFieldsOf(facts);
+  const int32_t offset = fields.empty() ? 0 : fields.back().offset + fields.back().width;
 
   Findings findings;
   int fd = open(table.c_str(), O_RDONLY);

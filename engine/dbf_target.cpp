@@ -44,7 +44,11 @@ class TableTarget : public Target {
     for (const IndexOption& o : opts_.table.indexes)
       if (o.name.find('.') != std::string::npos && access(o.name.c_str(), F_OK) != 0) made_index_files_.push_back(o.name);
     if (existing_) WarnStaleIndexes();
-    if (opts_.mode == 0 && !staging_.Begin(path_, &work_, error)) return false;
+    // A new table is built aside in every mode. An append or update that
+    // makes the table moves it into place only if no other run made it
+    // meanwhile: two appends to a table that didn't exist would otherwise
+    // each make it, and the second would replace the first's records.
+    if (!existing_ && !staging_.Begin(path_, &work_, error)) return false;
     return Target::Open(error);
   }
 
@@ -53,7 +57,7 @@ class TableTarget : public Target {
     spoke_->GetOption("version", v);
     int64_t end = -1;
     if (!VerifyTable(work_, connector_, v.c_str(), opts_.table, before_ + added, error, &end)) return false;
-    if (opts_.mode != 0) {
+    if (existing_) {
       if (!TrimToEndMark(work_, end)) return *error = "cannot cut " + path_ + " at its end mark: " + strerror(errno), false;
       // A table added to gets a .cpg file when it has none, like a new one.
       if (opts_.table.codepage != 0 && !HasSibling(path_, "cpg") && !WriteCpg(path_, opts_.table.codepage, error))
@@ -64,7 +68,7 @@ class TableTarget : public Target {
     // place with it; an old one would name another code page.
     if (opts_.table.codepage != 0 && !WriteCpg(work_, opts_.table.codepage, error)) return false;
     bool staged_mdx = HasSibling(work_, "mdx"), staged_cdx = HasSibling(work_, "cdx");
-    if (!staging_.Commit(error)) return false;
+    if (!staging_.Commit(opts_.mode != 0, error)) return false;
     // An MDX or CDX file of the target's name that the new table didn't
     // bring indexed the table just replaced: left there, it would be taken
     // for this table's and get its keys added to the old ones.

@@ -9,6 +9,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <cstdio>
 #include <cstdlib>
@@ -111,12 +112,15 @@ bool Staging::Begin(const std::string& dst, std::string* work, std::string* erro
     return false;
   }
   staging_ = buf.data();
+  name_ = base;
   *work = staging_ + "/" + base;
   return true;
 }
 
-bool Staging::Commit(std::string* error) {
+bool Staging::Commit(bool new_only, std::string* error) {
   std::vector<std::string> names = Entries();
+  // The table first: with `new_only` its link decides whether anything moves.
+  std::stable_partition(names.begin(), names.end(), [&](const std::string& n) { return n == name_; });
   // Checked before the first rename: a destination that is a directory, or
   // a file the user may not write (as cp refuses it), stops the move with
   // nothing moved.
@@ -145,6 +149,17 @@ bool Staging::Commit(std::string* error) {
   bool ok = true;
   for (const std::string& name : names) {
     std::string from = staging_ + "/" + name, to = dir_ + "/" + name, kept = staging_ + "/.old-" + name;
+    if (new_only && name == name_) {
+      if (link(from.c_str(), to.c_str()) != 0) {
+        *error = errno == EEXIST ? (dir_ == "." ? name : to) + " was made by another program while this run wrote it; nothing was added "
+                                       "(run again to add to it)"
+                                 : "cannot move " + name + " into " + dir_ + ": " + strerror(errno);
+        ok = false;
+        break;
+      }
+      moved.push_back({to, ""});
+      continue;
+    }
     bool had = link(to.c_str(), kept.c_str()) == 0;
     if (rename(from.c_str(), to.c_str()) != 0) {
       *error = "cannot move " + name + " into " + dir_ + ": " + strerror(errno);

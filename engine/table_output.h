@@ -41,13 +41,15 @@ class Staging {
   ~Staging() { Discard(); }
   // Makes the scratch directory; `work` is the path to build the table at.
   bool Begin(const std::string& dst, std::string* work, std::string* error);
-  // Moves every file made into the target's directory.
-  bool Commit(std::string* error);
+  // Moves every file made into the target's directory. With `new_only` the
+  // table must not exist there by then (it is moved first, by a link that
+  // fails on an existing file), and nothing is moved if it does.
+  bool Commit(bool new_only, std::string* error);
   void Discard();
 
  private:
   std::vector<std::string> Entries() const;
-  std::string dir_, staging_;
+  std::string dir_, name_, staging_;
 };
 
 // The undo journal of a run that changes a table in place (append, update):

@@ -120,6 +120,17 @@ cp base.dbf l.dbf
 wait $first && wait $second && PASSED=$((PASSED + 1)) || fail "concurrent appends failed"
 ALL=$((2 * (ROWS + 1) + 2))
 expect_run 0 info l.dbf && expect_out "records:     $ALL in the header, $ALL live"
+# Two appends to a table that doesn't exist yet: whichever way they meet, no
+# run's records are lost without a word (one makes it, the other adds to it
+# or adds nothing and says so).
+"$ZQDB" convert big.dbf new.dbf --mode append --no-progress 2>new1.err & first=$!
+"$ZQDB" convert big.dbf new.dbf --mode append --no-progress 2>new2.err & second=$!
+made=0
+wait $first && made=$((made + 1))
+wait $second && made=$((made + 1))
+[ $made = 2 ] || grep -q "new.dbf was made by another program while this run wrote it; nothing was added" new1.err new2.err ||
+  fail "a failed append said: $(cat new1.err new2.err)"
+expect_run 0 info new.dbf && expect_out "records:     $((made * (ROWS + 1))) in the header"
 
 # --- A full disk -----------------------------------------------------------------
 # A table with a memo file and an MDX tag on a 1 MB tmpfs; appending or
@@ -162,9 +173,12 @@ absent m.DBT o.dbf
 
 # --- Moving into place, permissions -----------------------------------------------
 # A destination that is a directory stops the move before any file is moved.
+printf 'NAME\nold\n' >old.csv && "$ZQDB" convert old.csv d.dbf 2>/dev/null && cp d.dbf d.before
 mkdir d.dbt
 expect_run 1 convert memo.csv d.dbf --schema "NAME C(10), NOTE M" && expect_err "zqdb: cannot replace ./d.dbt: it is a directory"
-absent d.dbf .zqdb-*
+same d.dbf d.before
+[ -d d.dbt ] && [ -z "$(ls -A d.dbt)" ] && PASSED=$((PASSED + 1)) || fail "d.dbt is no longer an empty directory"
+absent .zqdb-*
 # A replaced table keeps its mode; one the user may not write is refused in
 # every mode (as another user when run as root, who may write anything).
 cp m.dbf p.dbf && chmod 640 p.dbf

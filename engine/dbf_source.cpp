@@ -264,6 +264,10 @@ int CountDescriptors(const std::string& path, int* version) {
   return count;
 }
 
+// Visual dBASE 5.5 reads the version bytes of dBASE III and IV with up to
+// 1024 fields.
+bool ReadsAllFields(int version, int count) { return (version & 7) == 3 && count <= FieldsAtOpen(9); }
+
 // A table with more field descriptors than its dialect reads would lose the
 // fields behind the limit. Without a dialect named by the user, the table
 // is read as Visual dBASE 5.5 (1024 fields, the same version bytes and
@@ -280,7 +284,7 @@ void HoldAllFields(ZQSpoke* spoke, const std::string& path, bool chosen_by_user)
   if (count < 0 || limit == 0 || count <= limit) return;
   std::string has = path + " has " + std::to_string(count) + " fields, more than " + DialectName(dialect) +
                     " reads (" + std::to_string(limit) + ")";
-  if (!chosen_by_user && (version & 7) == 3 && count <= FieldsAtOpen(9)) {
+  if (!chosen_by_user && ReadsAllFields(version, count)) {
     spoke->SetOption("version", "9");
     Warn(has + ": read as Visual dBASE 5.5");
     return;
@@ -344,6 +348,12 @@ void WarnBlankMemos(const std::string& path, const ZQSpoke* spoke) {
 }
 
 }  // namespace
+
+int TableDialect(const std::string& path) {
+  int dialect = GuessDialect(path), version = 0, count = CountDescriptors(path, &version);
+  int limit = FieldsAtOpen(dialect);
+  return limit > 0 && count > limit && ReadsAllFields(version, count) ? 9 : dialect;
+}
 
 bool ResolveConnector(const std::string& type, TableConnector* out, std::string* error) {
   ModuleRegistry& r = ModuleRegistry::Get();

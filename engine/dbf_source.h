@@ -42,6 +42,9 @@ bool ApplyDialect(ZQSpoke* spoke, const std::string& value);
 // The dialect that a table's version byte points to, for tables opened
 // without --dialect.
 int GuessDialect(const std::string& path);
+// The dialect to add records to an existing table in: GuessDialect's, or
+// Visual dBASE 5.5 for a table with more fields than that dialect reads.
+int TableDialect(const std::string& path);
 // The name of a dialect number ("dBASE IV"), "?" for none.
 const char* DialectName(int dialect);
 // True when a file of the table's base name with the extension `ext` (in

@@ -158,7 +158,7 @@ std::unique_ptr<Target> MakeTableTarget(const std::string& path, const WriteOpti
     dialect = v.c_str();
   }
   if (dialect.empty() && opts.mode != 0 && access(path.c_str(), F_OK) == 0)
-    dialect = std::to_string(GuessDialect(path));
+    dialect = std::to_string(TableDialect(path));
   if (dialect.empty()) {
     ZQString v;  // a source that is no table has no version: dBASE IV
     dialect = source->GetOption("version", v) == 0 ? v.c_str() : "2";

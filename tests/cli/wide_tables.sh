@@ -30,6 +30,10 @@ wide_table w300.dbf 300
 expect_run 0 info w300.dbf && expect_out "fields:      300" && expect_out "dialect:     9 (Visual dBASE 5.5)"
 expect_err "zqdb: warning: w300.dbf has 300 fields, more than dBASE IV reads (256): read as Visual dBASE 5.5"
 expect_run 0 cat w300.dbf --format jsonl && expect_out '"F256":"6","F257":"7"' && expect_out '"F300":"0"}'
+# Records added to it fill every field, not only the first 256.
+expect_run 0 convert w300.dbf w300.dbf.csv && cp w300.dbf add300.dbf
+expect_run 0 convert w300.dbf.csv add300.dbf --mode append && expect_run 0 cat add300.dbf --format jsonl &&
+  [ "$(grep -c '"F300":"0"}' "$OUT")" = 2 ] && PASSED=$((PASSED + 1)) || fail "an appended record lost F257..F300"
 # Named by the user: read as that dialect, the rest counted.
 expect_run 0 info w300.dbf --dialect "dBASE IV" && expect_out "fields:      256"
 expect_err "zqdb: warning: w300.dbf has 300 fields, more than dBASE IV reads (256): the last 44 are left out"

@@ -518,6 +518,9 @@ int RunCheck(const std::string& table, const SourceOptions& source, const CheckR
   SourceOptions quiet = source;
   // Memos are checked from the memo file's bytes; the spoke reads the rest.
   quiet.memo_policy = 2;
+  // Keys are built from the bytes the records hold, as the index kinds
+  // store them: no code page conversion.
+  quiet.codepage = 0;
   SourcePtr spoke;
   std::string error;
   if (OpenSource(table, quiet, &spoke, &error) != 0) return Fail(error);

@@ -170,9 +170,12 @@ std::unique_ptr<Target> MakeTableTarget(const std::string& path, const WriteOpti
   if (resolved.table.codepage == kCodePageUnset)
     resolved.table.codepage =
         opts.mode != 0 && access(path.c_str(), F_OK) == 0 ? ChooseCodePage(path, kCodePageUnset).codepage : 0;
+  // Text reaches the module already in the table's code page (the field
+  // plan converts it): the index keys the module builds from the record are
+  // then the bytes the record holds, as other programs build them, and the
+  // update's keys of the records read back compare in the same bytes.
+  spoke->SetOption("codepage", "0");
   char buf[16];
-  snprintf(buf, sizeof buf, "%d", ModuleCodePage(resolved.table.codepage));
-  spoke->SetOption("codepage", buf);
   snprintf(buf, sizeof buf, "%d", opts.table.memo_policy);
   spoke->SetOption("ignorememoerr", buf);
   return std::make_unique<TableTarget>(std::move(spoke), path, connector, resolved);

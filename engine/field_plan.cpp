@@ -171,7 +171,7 @@ bool FieldPlan::Fill(int32_t n, std::string* error, bool again) {
                " field";
       return false;
     } else if (codepage_ != 0 && (r.check.letter == 'C' || r.check.letter == 'M') &&
-               f->held() == ZQField::Held::kText && !CheckText(n, r, f, again, error)) {
+               f->held() == ZQField::Held::kText && !CheckText(n, r, f, again, cut, error)) {
       return false;
     } else if (r.check.cut > cut && Warnings() == WarnMode::kStrict) {
       const ZQString& v = in[r.from]->StringRef();
@@ -185,9 +185,10 @@ bool FieldPlan::Fill(int32_t n, std::string* error, bool again) {
 }
 
 // Text on its way into a code page: characters the code page lacks are
-// counted (or refused), and memo text is converted here, since the target
-// stores memos as they are given.
-bool FieldPlan::CheckText(int32_t n, const FieldRoute& r, ZQField* f, bool again, std::string* error) {
+// counted (or refused), and the text is converted here, since the target
+// takes bytes as they are to be stored. A character field's width counts
+// those bytes: `cut_before` is the count of values cut before this one.
+bool FieldPlan::CheckText(int32_t n, FieldRoute& r, ZQField* f, bool again, int64_t cut_before, std::string* error) {
   const ZQString& s = f->StringRef();
   if (!bytescan::HasHighBit(s.c_str(), size_t(s.length()))) return true;
   int32_t lost = Utf8Unmappable(codepage_, s.c_str(), s.length());
@@ -203,11 +204,10 @@ bool FieldPlan::CheckText(int32_t n, const FieldRoute& r, ZQField* f, bool again
       unmappable_ += lost;
     }
   }
-  if (r.check.letter == 'M') {
-    scratch_ = s;
-    ZQGlob::InternalToExternal(codepage_, scratch_);
-    f->AssignText(scratch_.c_str(), scratch_.length());
-  }
+  scratch_ = s;
+  ZQGlob::InternalToExternal(codepage_, scratch_);
+  f->AssignText(scratch_.c_str(), scratch_.length());
+  if (r.check.letter == 'C') r.check.cut = cut_before + (scratch_.length() > r.check.width ? 1 : 0);
   return true;
 }
 

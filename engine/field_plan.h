@@ -68,7 +68,7 @@ class FieldPlan {
   void Match(ZQExport* target);
   bool Plan(ZQExport* target, std::string* error);
 
-  bool CheckText(int32_t n, const FieldRoute& r, ZQField* f, bool again, std::string* error);
+  bool CheckText(int32_t n, FieldRoute& r, ZQField* f, bool again, int64_t cut_before, std::string* error);
 
   std::vector<int> select_;  // the source fields that go, in order
   ZQRecord* in_ = nullptr;

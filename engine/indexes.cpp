@@ -11,8 +11,10 @@
 #include "engine/outbuf.h"
 #include "engine/report.h"
 #include "engine/writers.h"
+#include "host/bytescan.h"
 #include "host/endian.h"
 #include "host/zqdate.h"
+#include "host/zqglob.h"
 
 namespace {
 
@@ -189,9 +191,17 @@ bool SeekKey(const std::string& text, const ZQIndexDef& def, ZQString* key) {
   return true;
 }
 
-void PutKey(OutBuf& out, const ZQString& key, KeyForm form, bool jsonl) {
+// Text keys hold the table's bytes, in its code page (`codepage`, 0 for
+// none): shown as UTF-8 like the table's values.
+void PutKey(OutBuf& out, const ZQString& key, KeyForm form, bool jsonl, int codepage, ZQString* scratch) {
   const char* p = key.c_str();
   size_t n = size_t(key.length());
+  if (form == KeyForm::kText && codepage != 0 && bytescan::HasHighBit(p, n)) {
+    *scratch = key;
+    ZQGlob::ExternalToInternal(codepage, *scratch);
+    p = scratch->c_str();
+    n = size_t(scratch->length());
+  }
   if (form == KeyForm::kNumber && n >= 8) {
     uint64_t bits = GetLe64(reinterpret_cast<const uint8_t*>(p));
     double v;
@@ -237,6 +247,9 @@ int WriteKeys(ZQImport* spoke, const KeysOptions& opts) {
     fprintf(stderr, "zqdb: --seek: %s is no number or date, as the keys of this index are\n", opts.seek.c_str());
     return 2;
   }
+  ZQString v, shown;
+  const int codepage = spoke->GetOption("codepage", v) == 0 ? atoi(v.c_str()) : 0;
+  if (opts.has_seek && form == KeyForm::kText && codepage != 0) ZQGlob::InternalToExternal(codepage, start);
   // A key that names a record past the table's end shows an index that
   // doesn't belong to the table as it is: the keys are printed, and the
   // run ends with a warning and exit status 1.
@@ -250,7 +263,7 @@ int WriteKeys(ZQImport* spoke, const KeysOptions& opts) {
   // With --seek and --reverse the walk goes back from the key found.
   while (r != -1) {
     if (opts.jsonl) out.Put("{\"key\": ");
-    PutKey(out, key, form, opts.jsonl);
+    PutKey(out, key, form, opts.jsonl, codepage, &shown);
     out.Put(opts.jsonl ? ", \"recno\": " : ",");
     out.PutInt(int64_t(r) + 1);
     out.Put(opts.jsonl ? "}\n" : "\n");

@@ -113,6 +113,7 @@ bool Rebuild(const std::string& table, const SourceOptions& source, const std::v
              const std::vector<IndexOption>& added, bool tags_only, std::string* summary, std::string* error) {
   SourceOptions quiet = source;
   quiet.memo_policy = 2;  // no key is made of a memo
+  quiet.codepage = 0;     // keys are of the bytes the records hold, in the table's code page
   SourcePtr spoke;
   if (OpenSource(table, quiet, &spoke, error) != 0) return false;
   ZQString version;

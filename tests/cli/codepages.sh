@@ -73,4 +73,13 @@ same "append in 850" "$(hex copy.dbf 137 3)" "5a6f89"
 printf 'NAME\nplain\n' >plain.csv
 expect_run 0 convert plain.csv copy.dbf && err_has "zqdb: warning: removed copy.cpg, the code page file"
 [ -e copy.cpg ] && fail "copy.cpg left behind" || PASSED=$((PASSED + 1))
+# Index keys hold the table's bytes in its code page, as other programs build
+# them; a width counts those bytes; keys and --seek speak UTF-8.
+printf 'CITY\nBesançon12\nÉvreux\nAbbeville\n' >cities.csv
+expect_run 0 convert cities.csv k.dbf --schema "CITY C(10)" --codepage 850 --index CITY=CITY
+[ ! -s "$ERR" ] && PASSED=$((PASSED + 1)) || fail "a value that fits its 10 bytes in 850 warned: $(cat "$ERR")"
+grep -qa "$(printf 'Besan\x87on12')" k.mdx && PASSED=$((PASSED + 1)) || fail "k.mdx lacks the key in code page 850"
+expect_run 0 keys k.dbf --index CITY --seek "Év" && expect_out "Évreux,2"
+expect_run 0 convert cities.csv k.dbf --mode update --key CITY && expect_run 0 check k.dbf
+expect_run 0 info k.dbf && expect_out "records:     3 in the header"
 finish

@@ -2,6 +2,7 @@
 
 #include <unistd.h>
 
+#include <climits>
 #include <cstdio>
 #include <cstring>
 #include <memory>
@@ -17,6 +18,25 @@
 #include "engine/table_output.h"
 #include "host/journal.h"
 #include "engine/transfer.h"
+
+namespace {
+
+// The file a failed write was to, as the user knows it: a file of the
+// scratch directory by the name it was to take, one of the current directory
+// without its path; `dst` when the file is unknown or is zqdb's own.
+std::string WrittenFile(const std::string& dst) {
+  std::string file = journal::LastWriteFile();
+  size_t slash = file.rfind('/');
+  if (file.empty() || slash == std::string::npos || file.find(kStagingPrefix, slash) == slash + 1) return dst;
+  size_t scratch = file.rfind(std::string("/") + kStagingPrefix, slash - 1);
+  if (scratch != std::string::npos && scratch < slash) file.erase(scratch, slash - scratch);
+  char cwd[PATH_MAX];
+  if (getcwd(cwd, sizeof cwd) != nullptr && file.compare(0, strlen(cwd) + 1, std::string(cwd) + "/") == 0)
+    file.erase(0, strlen(cwd) + 1);
+  return file;
+}
+
+}  // namespace
 
 int RunConvert(const std::string& src, const std::string& named, const ConvertOptions& opts) {
   const Endpoint& to = opts.target != nullptr ? *opts.target
@@ -111,7 +131,7 @@ int RunConvert(const std::string& src, const std::string& named, const ConvertOp
   if (ok) ok = target->Finish(counts.added, &error);
   if (!ok) {
     // A write that failed says why (the module only counts it).
-    if (int e = journal::LastWriteError()) error = "cannot write " + dst + ": " + strerror(e);
+    if (int e = journal::LastWriteError()) error = "cannot write " + WrittenFile(dst) + ": " + strerror(e);
     std::string undo_error;
     if (!undo.Restore(&undo_error)) error += "; and restoring it failed: " + undo_error;
     else if (target->AddsToExisting()) error += " (the table was left as it was before the run)";

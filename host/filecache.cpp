@@ -72,7 +72,7 @@ bool WriteBack(Page* p) {
     ssize_t w = ::pwrite(f->fds.front(), p->data + done, size_t(n - done), off_t(at + done));
     if (w < 0 && errno == EINTR) continue;
     if (w <= 0) {
-      journal::NoteWriteError(w == 0 ? ENOSPC : errno);
+      journal::NoteWriteError(w == 0 ? ENOSPC : errno, f->fds.front());
       return false;
     }
     done += w;

@@ -32,6 +32,7 @@ std::string jpath;
 std::vector<File> files;
 std::vector<int> byFd;  // descriptor -> file number + 1, 0 = not watched
 int lastError = 0;
+char lastFile[PATH_MAX] = "";
 
 bool WriteAll(int fd, const void* data, size_t n) {
   const char* p = static_cast<const char*>(data);
@@ -251,6 +252,18 @@ bool Restore(const std::string& path, std::string* error) {
 }
 
 int LastWriteError() { return lastError; }
-void NoteWriteError(int error) { lastError = error; }
+const char* LastWriteFile() { return lastFile; }
+
+void NoteWriteError(int error, int fd) {
+  lastError = error;
+  lastFile[0] = '\0';
+  if (fd < 0) return;
+  // The name the descriptor was opened by, for the message of a failed run
+  // (read only on this path: writes that fail are rare).
+  char link[32];
+  snprintf(link, sizeof link, "/proc/self/fd/%d", fd);
+  ssize_t n = readlink(link, lastFile, sizeof lastFile - 1);
+  lastFile[n > 0 ? n : 0] = '\0';
+}
 
 }  // namespace journal

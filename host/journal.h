@@ -40,6 +40,9 @@ bool RestoreActive(std::string* error);
 
 // The errno of the last failed write of any file of this layer, 0 if none.
 int LastWriteError();
-void NoteWriteError(int error);
+// The path of the file whose write failed last, "" when unknown.
+const char* LastWriteFile();
+// Notes a failed write of `fd` (-1 when no file is known).
+void NoteWriteError(int error, int fd = -1);
 
 }  // namespace journal

@@ -103,7 +103,7 @@ int32_t _write(int fd, const void* buffer, uint32_t count) {
   }
   do n = ::write(fd, buffer, count);
   while (n < 0 && errno == EINTR);
-  if (n < 0) journal::NoteWriteError(errno);
+  if (n < 0) journal::NoteWriteError(errno, fd);
   return int32_t(n);
 }
 

@@ -75,7 +75,7 @@ bool ZQFileProxy::WriteOut(const char* p, int64_t off, int64_t len) {
     ssize_t n = pwrite(fd_, p, size_t(len), off);
     if (n < 0 && errno == EINTR) continue;
     if (n <= 0) {
-      journal::NoteWriteError(n == 0 ? ENOSPC : errno);
+      journal::NoteWriteError(n == 0 ? ENOSPC : errno, fd_);
       error_ = true;
       return false;
     }

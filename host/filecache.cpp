@@ -88,6 +88,8 @@ void Drop(Page* p) {
   delete p;
 }
 
+int64_t pageBudget = kMaxPages;
+
 bool Evict() {
   Page* p = oldest;
   if (p == nullptr) return true;
@@ -108,7 +110,7 @@ Page* GetPage(File* f, int64_t index, bool fill) {
     return p;
   }
   if (index >= int64_t(f->pages.size())) f->pages.resize(size_t(index) + 1 + f->pages.size() / 2, nullptr);
-  if (pageCount >= kMaxPages && !Evict()) {
+  if (pageCount >= pageBudget && !Evict()) {
     errno = EIO;
     return nullptr;
   }
@@ -240,6 +242,12 @@ int64_t Write(int fd, const void* buffer, int64_t count, int64_t offset) {
     if (at + n > f->size) f->size = at + n;
   }
   return done;
+}
+
+void SetPageBudget(int64_t pages) {
+  pageBudget = pages > 0 ? pages : kMaxPages;
+  while (pageCount > pageBudget && Evict()) {
+  }
 }
 
 int64_t Size(int fd) {

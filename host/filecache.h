@@ -6,8 +6,11 @@
 // Pages belong to the file (device and inode), not to a descriptor, so that
 // the several descriptors a program opens on one index file see each other's
 // writes at once. Changed pages go to the file when they are evicted and when
-// the last descriptor of the file closes. The cache holds at most kMaxPages
-// pages in all, whatever the file sizes. One thread at a time.
+// the last descriptor of the file closes. The cache holds at most
+// kMaxPages pages in all, whatever the file sizes: enough for the whole of
+// an index of a few million keys, whose inserts land on random blocks (a
+// smaller cache writes the same blocks out again and again). One thread at
+// a time.
 #pragma once
 
 #include <cstdint>
@@ -15,7 +18,10 @@
 namespace filecache {
 
 constexpr int64_t kPage = 4096;
-constexpr int64_t kMaxPages = 8192;  // 32 MiB
+constexpr int64_t kMaxPages = 65536;  // 256 MiB
+
+// Lowers (or restores) the number of pages held, for tests of eviction.
+void SetPageBudget(int64_t pages);
 
 // Takes over a descriptor just opened; `truncated` when the open cut the file.
 void Attach(int fd, bool truncated);

@@ -1,6 +1,7 @@
 // Key expressions, key bytes, and the cursor shared by every index kind.
 #include "index/dbindex.h"
 
+#include <cerrno>
 #include <cstdlib>
 
 #include "host/platform.h"
@@ -89,8 +90,14 @@ int32_t ZQDBIndexBase::GetFirst() {
 
 int32_t ZQDBIndexBase::GetNext() { return GetRecord(position + 1); }
 
+void ZQDBIndexBase::OpenExisting(const char* path) {
+  fd = _open(path, kRtReadWrite | kRtBinary);
+  readOnly = fd < 0 && (errno == EACCES || errno == EROFS || errno == EPERM);
+  if (readOnly) fd = _open(path, kRtReadOnly | kRtBinary);
+}
+
 bool ZQDBIndexBase::AddKey(ZQString& key, int32_t record) {
-  if (root == nullptr) return false;
+  if (root == nullptr || readOnly) return false;
   dirty = true;
   return root->AddKey(key, record + 1);
 }

@@ -70,10 +70,15 @@ class ZQ_EXPORT ZQDBIndexBase {
   // cycle of blocks) ends it instead of looping. False once that is spent.
   bool Step();
   void ResetSteps();
+  // Opens an existing index file read-write, or read-only where the file
+  // allows no more: walking and seeking need no write, and AddKey then
+  // refuses. Sets `fd`.
+  void OpenExisting(const char* path);
 
   ZQRecord fields;
   int32_t position = -1;
   int fd = -1;
+  bool readOnly = false;
   bool dirty = false;
   ZQDBNodeBase* root = nullptr;
   ZQDBNodeBase* leaf = nullptr;

@@ -209,18 +209,6 @@ ZQDBFoxIndex::~ZQDBFoxIndex() {
   if (dirty) Flush();
 }
 
-// Read-write, or read-only where the file allows no more: walking needs no
-// write, and AddKey then refuses.
-void ZQDBFoxIndex::OpenExisting(const char* path) {
-  fd = _open(path, kRtReadWrite | kRtBinary);
-  readOnly = fd < 0;
-  if (readOnly) fd = _open(path, kRtReadOnly | kRtBinary);
-}
-
-bool ZQDBFoxIndex::AddKey(ZQString& key, int32_t record) {
-  return !readOnly && ZQDBIndexBase::AddKey(key, record);
-}
-
 bool ZQDBFoxIndex::Fail(const char* why) {
   reason = why;
   ok = false;

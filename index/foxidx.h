@@ -76,8 +76,6 @@ class ZQ_EXPORT ZQDBFoxIndex : public ZQDBIndexBase {
   int16_t KeyLength() const { return keyLength; }
   // The key expression as the header holds it.
   void Expression(ZQString& out) const { out = expression; }
-  // False on an index opened read-only (the file allows no writing).
-  bool AddKey(ZQString& key, int32_t record) override;
   // Why the index is not OK; "" when it is.
   const char* Reason() const { return reason; }
   // Writes the header and every changed block now. False if a write failed.
@@ -89,7 +87,6 @@ class ZQ_EXPORT ZQDBFoxIndex : public ZQDBIndexBase {
                       bool tagList);
   void BuildRootNode(int32_t where, ZQString& buffer, int keyLength);
   void ReadHeader();
-  void OpenExisting(const char* path);
   bool OpenTagList(const char* path, ZQDBFoxIndex*& taglist);
   void CreateTag(const char* path, const char* name, int32_t length, const ZQRecord& keyfields,
                  const ZQIndexDef& def, ZQDBFoxIndex*& taglist);
@@ -102,7 +99,6 @@ class ZQ_EXPORT ZQDBFoxIndex : public ZQDBIndexBase {
   int16_t keyLength = 0;
   bool compact = false;
   bool unique = false;
-  bool readOnly = false;
   ZQString expression;
   const char* reason = "";
 };

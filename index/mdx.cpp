@@ -78,7 +78,7 @@ ZQDBMdx::ZQDBMdx(const char* table, const char* tag) {
   ZQString scratch;
   if (!scratch.Allocate(kTagHeaderRead)) return;
   if (HasExtension(tag, "ndx")) {
-    fd = _open(tag, kRtReadWrite | kRtBinary);
+    OpenExisting(tag);
     blockUnits = 1;
     blockSize = kUnit;
     isMdx = false;
@@ -90,7 +90,7 @@ ZQDBMdx::ZQDBMdx(const char* table, const char* tag) {
   if (n + 5 >= sizeof path) return;
   memcpy(path, table, n + 1);
   ZQGlob::appndext(path, "mdx");
-  fd = _open(path, kRtReadWrite | kRtBinary);
+  OpenExisting(path);
   if (fd == -1) return;
   uint8_t head[kFileHeaderRead];
   if (!ReadAt(fd, 0, head, kFileHeaderRead)) return;

@@ -194,6 +194,14 @@ for mode in replace append; do
   expect_err "zqdb: cannot write shared/m.dbf: Permission denied"
   same shared/m.dbf ro.before
 done
+# Index files the user may only read are still checked, walked and sought.
+"$ZQDB" convert memo.csv shared/i.dbf --schema "NAME C(10), NOTE M" --index NAME=NAME --index shared/i.ndx=NAME 2>/dev/null
+chmod 444 shared/i.*
+for command in "check shared/i.dbf --index shared/i.ndx" "keys shared/i.dbf --index NAME --seek ann" "keys shared/i.dbf --index shared/i.ndx"; do
+  # shellcheck disable=SC2086
+  $as_user "$ZQDB" $command >"$OUT" 2>"$ERR" && grep -q "ann\|clean" "$OUT" && PASSED=$((PASSED + 1)) ||
+    fail "zqdb $command on read-only files: $(cat "$ERR")"
+done
 
 # --- Output errors ------------------------------------------------------------------
 for command in "info m.dbf" "info m.dbf --format json" "cat m.dbf" "formats" "--help" "help convert" "convert m.dbf -"; do

@@ -102,7 +102,8 @@ int RunConvert(const std::string& src, const std::string& named, const ConvertOp
   // its memo file and its index files as they were.
   if (target->AddsToExisting() && !CheckValues(source.get(), plan, &error)) return Fail(error);
 
-  if (target->AddsToExisting() && !undo.Begin(dst, &error)) return Fail(error);
+  // (A SQLite database keeps its own journal.)
+  if (table_target && target->AddsToExisting() && !undo.Begin(dst, &error)) return Fail(error);
   if (!target->Open(&error)) return Fail(error);
   std::unique_ptr<KeyedRecords> keyed;
   if (opts.write.mode == 2) {

@@ -92,6 +92,16 @@ expect_run 0 info u.dbf && err_has "zqdb: warning: u.dbf was restored to what it
 same u.dbf big.dbf
 absent .zqdb-*
 
+# A killed run into a new SQLite database leaves nothing under its name (the
+# next run removes the scratch file); one killed while adding to an existing
+# database leaves the rows it had, to SQLite's own journal, and nothing else.
+kill_when "[ \$(size k.sqlite.zqdb-part) -gt 100000 ]" convert big.dbf k.sqlite
+absent k.sqlite
+expect_run 0 convert two.csv k.sqlite --table big && absent k.sqlite.zqdb-part
+kill_when "[ \$(size k.sqlite) -gt 1000000 ]" convert big.dbf k.sqlite --mode append
+[ "$(sqlite3 k.sqlite 'SELECT count(*) FROM big')" = 2 ] && PASSED=$((PASSED + 1)) || fail "killed append changed k.sqlite"
+absent .zqdb-*
+
 # --- A second writer -------------------------------------------------------------
 # The shell holds the table's lock as another zqdb would (flock on the table).
 cp base.dbf l.dbf && cp l.dbf l.before

@@ -50,10 +50,33 @@ with workdir() as d:
         rc, _, err = run([ZQDB, "convert", os.path.join(d, "shop.sqlite"), back, "--table", "people", "--no-progress"])
         s.check("convert from SQLite", rc == 0, err.strip())
         compare(s, "SQLite source", back, sqlite_rows(os.path.join(d, "shop.sqlite"), "people"))
-    with s.case("a failed append leaves the database as it was"):
+    with s.case("rows by the statement: whole statements and the rest, new and appended"):
+        # 75 rows: two statements of 32 rows and one of 11, into a new
+        # database and again into the same table.
+        many = os.path.join(d, "many.csv")
+        with open(many, "w") as f:
+            f.write("ID,NAME,AMOUNT\n")
+            for i in range(75):
+                f.write('%d,"row %d ""q"" \\",%s\n' % (i, i, "" if i % 7 == 0 else "%d.25" % i))
+        table = os.path.join(d, "many.dbf")
+        rc, _, err = run([ZQDB, "convert", many, table, "--no-progress"])
+        s.check("many.dbf made", rc == 0, err.strip())
+        db = os.path.join(d, "many.sqlite")
+        for mode in ("replace", "append"):
+            rc, _, err = run([ZQDB, "convert", table, db, "--mode", mode, "--no-progress"])
+            s.check("many rows --mode " + mode, rc == 0, err.strip())
+        rows = sqlite_rows(db, "many")
+        compare(s, "many rows, first run", table, rows[:75])
+        compare(s, "many rows, appended", table, rows[75:])
+    with s.case("a failed run leaves no new database behind"):
         bad = os.path.join(d, "bad.csv")
         with open(bad, "w") as f:
             f.write("NAME,QTY\nx,1\ny,not a number\n")
+        new = os.path.join(d, "new.sqlite")
+        rc, _, _ = run([ZQDB, "convert", bad, new, "--schema", "QTY N(6,0)", "--no-progress"])
+        left = [n for n in os.listdir(d) if n.startswith("new.sqlite")]
+        s.check("failed run left nothing", rc == 1 and not left, "exit %d, left %r" % (rc, left))
+    with s.case("a failed append leaves the database as it was"):
         rc, _, _ = run([ZQDB, "convert", bad, os.path.join(d, "shop.sqlite"), "--table", "people", "--mode", "append",
                         "--schema", "QTY N(6,0)", "--no-progress"])
         rows = sqlite_rows(os.path.join(d, "shop.sqlite"), "people")

@@ -123,29 +123,52 @@ static bool IsLogicalText(const ZQString& s) {
   return false;
 }
 
-bool CopyValue(ZQField* dst, ZQField* src, FieldCheck* check) {
-  if (src->held() == ZQField::Held::kText) {
-    FIELDTYPE t = dst->FieldType();
-    const ZQString& s = src->StringRef();
-    bool numeric = t == FT_NUMERIC || t == FT_INTEGER || t == FT_FLOAT || t == FT_CURRENCY;
-    if (numeric && !IsNumberText(s)) return false;
-    if (t == FT_BOOLEAN && !IsLogicalText(s)) return false;
-    if (t == FT_DATE) {
-      dst->AssignText(s.c_str(), s.length());
-      return dst->held() != ZQField::Held::kText;
+// True when assigning text held by `src` to `dst` keeps it byte for byte:
+// `dst` takes any text as it is, or both hold numbers, whose text the source
+// field has already trimmed.
+static bool KeepsText(const ZQField* dst, const ZQField* src) {
+  switch (dst->FieldType()) {
+    case FT_DATE:
+    case FT_BOOLEAN: return false;
+    case FT_NUMERIC:
+    case FT_INTEGER:
+    case FT_FLOAT:
+    case FT_CURRENCY: {
+      FIELDTYPE t = src->FieldType();
+      return t == FT_NUMERIC || t == FT_INTEGER || t == FT_FLOAT || t == FT_CURRENCY;
     }
+    default: return true;
   }
+}
+
+bool CopyValue(ZQField* dst, ZQField* src, FieldCheck* check, bool move) {
   switch (src->held()) {
+    case ZQField::Held::kText: {
+      FIELDTYPE t = dst->FieldType();
+      const ZQString& s = src->StringRef();
+      bool numeric = t == FT_NUMERIC || t == FT_INTEGER || t == FT_FLOAT || t == FT_CURRENCY;
+      if (numeric && !IsNumberText(s)) return false;
+      if (t == FT_BOOLEAN && !IsLogicalText(s)) return false;
+      if (t == FT_DATE) {
+        dst->AssignText(s.c_str(), s.length());
+        return dst->held() != ZQField::Held::kText;
+      }
+      bool cut = check->letter == 'C' && s.length() > check->width;
+      if (cut) ++check->cut;
+      bool checked = check->widths && IsNumberLetter(check->letter);
+      // The source's text is taken over rather than copied when nothing
+      // below may still need it for a message (a cut, a number's check).
+      if (move && !cut && !checked && KeepsText(dst, src)) {
+        dst->TakeText(*src);
+        return true;
+      }
+      dst->AssignText(s.c_str(), s.length());
+      return !checked || NumberFits(dst, *check);
+    }
     case ZQField::Held::kBlank:
       dst->Blank();
       if (check->letter == 'L') ++check->blank_logicals;
       return true;
-    case ZQField::Held::kText: {
-      const ZQString& s = src->StringRef();
-      if (check->letter == 'C' && s.length() > check->width) ++check->cut;
-      dst->AssignText(s.c_str(), s.length());
-      return !check->widths || !IsNumberLetter(check->letter) || NumberFits(dst, *check);
-    }
     case ZQField::Held::kLong:
       dst->SetLong(src->LongVal());
       return !check->widths || !IsNumberLetter(check->letter) || NumberFits(dst, *check);

@@ -20,8 +20,9 @@ struct FieldCheck {
 // Copies a value; false when the target's field can't hold it (text that is
 // no number for a number, no date for a date, no logical for a logical, a
 // number too wide for its field), so that nothing is stored as something else
-// or lost without a word.
-bool CopyValue(ZQField* dst, ZQField* src, FieldCheck* check);
+// or lost without a word. With `move`, text may be taken from `src` instead
+// of copied, leaving `src` blank (ZQField::TakeText).
+bool CopyValue(ZQField* dst, ZQField* src, FieldCheck* check, bool move = false);
 
 // True when a table stores the number now in `dst` whole in a field of
 // `check`: N and F within their width at their decimals (never with the high

@@ -48,6 +48,9 @@ bool FieldPlan::Make(ZQRecord& in, ZQExport* target, const std::string& path, bo
   } else if (!Plan(target, error)) {
     return false;
   }
+  for (FieldRoute& r : routes_)
+    r.sole = r.from >= 0 && std::count_if(routes_.begin(), routes_.end(),
+                                           [&](const FieldRoute& o) { return o.from == r.from; }) == 1;
   int bad_field = -1;
   if (target->ValidateLocalRecord(*out_, bad_field) != 0) {
     *error = std::string("records are too long for the target from field ") +
@@ -152,7 +155,7 @@ void FieldPlan::CheckWidths(bool check) {
   for (FieldRoute& r : routes_) r.check.widths = check;
 }
 
-bool FieldPlan::Fill(int32_t n, std::string* error, bool again) {
+bool FieldPlan::Fill(int32_t n, std::string* error, bool again, bool move) {
   ZQRecord& in = *in_;
   ZQRecord& out = *out_;
   for (size_t i = 0; i < routes_.size(); ++i) {
@@ -160,7 +163,7 @@ bool FieldPlan::Fill(int32_t n, std::string* error, bool again) {
     ZQField* f = out[int(i)];
     if (r.from < 0) {
       f->Blank();
-    } else if (int64_t cut = r.check.cut; !CopyValue(f, in[r.from], &r.check)) {
+    } else if (int64_t cut = r.check.cut; !CopyValue(f, in[r.from], &r.check, move && r.sole)) {
       const ZQString& v = in[r.from]->StringRef();
       std::string type(1, r.check.letter);
       if (r.check.letter == 'N' || r.check.letter == 'F')

@@ -17,6 +17,7 @@ struct FieldRoute {
   int from;           // the source field that feeds it; -1: left blank
   std::string name;   // the target field's name
   FieldCheck check;   // its type letter and width, and what its values lost
+  bool sole = false;  // no other target field is fed by `from`
 };
 
 // The positions in `layout` of the fields `names` (any case), in that
@@ -51,8 +52,10 @@ class FieldPlan {
   // Fills the target's record from the source's current one. False when a
   // value doesn't fit its target field, with `error` naming record `n`
   // (0-based), the field and the value. `again`: the record was filled
-  // before, so what it loses is not counted twice.
-  bool Fill(int32_t n, std::string* error, bool again = false);
+  // before, so what it loses is not counted twice. `move`: the source's
+  // record is read no more before the next one, so text that a target field
+  // keeps as it stands is taken from it rather than copied.
+  bool Fill(int32_t n, std::string* error, bool again = false, bool move = false);
 
   // Warns of the values changed on the way: text cut to its field, blank
   // logicals written as F when the target keeps no blank, and characters

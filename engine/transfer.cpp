@@ -87,7 +87,8 @@ bool Transfer(ZQImport* source, ZQExport* target, FieldPlan& plan, KeyedRecords*
     rc = source->GetRecord(n);
     if (rc != 0) break;
     fix.Apply(*source->GetLayout(0));
-    if (!plan.Fill(n, &bad_value)) {
+    // An update fills the record twice from the source's: it is copied.
+    if (!plan.Fill(n, &bad_value, false, keyed == nullptr)) {
       rc = ZQ_WRITE_ERROR;
       break;
     }

@@ -41,6 +41,15 @@ class ZQField {
   void SetLong(int64_t value);
   // Blanks the value; the text buffer keeps its room for the next value.
   void Blank() { held_ = Held::kBlank; }
+  // Takes the text that `src` holds (REQUIRES: src.held() == Held::kText)
+  // as it stands, without copying it: the two fields exchange their text
+  // buffers and `src` is left blank. For a record loop that moves each value
+  // on, when assigning the text would keep it byte for byte.
+  void TakeText(ZQField& src) {
+    text_.Swap(src.text_);
+    held_ = Held::kText;
+    src.held_ = Held::kBlank;
+  }
 
   void Name(const char* name);
   const char* Name() const { return name_.c_str(); }

@@ -214,17 +214,6 @@ void ZQString::StripChars(bool leading, bool trailing, char c) {
   data_[len_] = '\0';
 }
 
-void ZQString::Swap(ZQString& other) noexcept {
-  char* d = data_;
-  int32_t l = len_, c = cap_;
-  data_ = other.data_;
-  len_ = other.len_;
-  cap_ = other.cap_;
-  other.data_ = d;
-  other.len_ = l;
-  other.cap_ = c;
-}
-
 void ZQString::Extract(const ZQString& in) { *this = in.pending_ ? in.pending_ : ""; }
 
 int ZQString::Compare(const char* text, int32_t length) const {

@@ -69,7 +69,16 @@ class ZQString {
   void ToLower();
   void StripChars(bool leading, bool trailing, char c);
   // Exchanges contents with `other` (no copy).
-  void Swap(ZQString& other) noexcept;
+  void Swap(ZQString& other) noexcept {
+    char* d = data_;
+    int32_t l = len_, c = cap_;
+    data_ = other.data_;
+    len_ = other.len_;
+    cap_ = other.cap_;
+    other.data_ = d;
+    other.len_ = l;
+    other.cap_ = c;
+  }
   // Takes the value that NextKeyword left in `in`.
   void Extract(const ZQString& in);
 

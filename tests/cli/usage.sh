@@ -109,6 +109,9 @@ assert d['records_in_header'] == 2 and 'cut short' in d['error'], d" || fail "in
 expect_run 0 cat t.dbf --fields qty,NAME && expect_out "QTY,NAME" && expect_out "42,alice"
 expect_run 0 convert t.dbf f.jsonl --fields QTY
 [ "$(cat f.jsonl)" = '{"QTY":42}' ] && PASSED=$((PASSED + 1)) || fail "convert --fields: $(cat f.jsonl)"
+# A field named twice feeds both columns: its value is copied, not moved on.
+expect_run 0 convert t.dbf twice.csv --fields NAME,NAME,QTY --quiet
+[ "$(tail -1 twice.csv | tr -d "\r")" = "alice,alice,42" ] && PASSED=$((PASSED + 1)) || fail "--fields NAME,NAME: $(cat twice.csv)"
 expect_run 2 cat t.dbf --fields NAME,COLOR && expect_err "zqdb: --fields: no field COLOR; the fields are NAME, QTY"
 expect_run 2 convert t.dbf g.csv --fields COLOR && expect_err "zqdb: --fields: no field COLOR"
 [ ! -e g.csv ] && PASSED=$((PASSED + 1)) || fail "--fields error left g.csv"

@@ -144,19 +144,23 @@ BATCHERR ZQDbase::ReadRecord(int32_t n) {
   return 0;
 }
 
-void ZQDbase::DecodeText(ZQField* field, const char* raw, int32_t length, int codepage) {
+// Kept out of line, so that the common path of DecodeText is inlined into
+// the record loop.
+__attribute__((noinline)) void ZQDbase::DecodeCodePage(ZQField* field, const char* raw, int32_t kept,
+                                                       int codepage) {
+  FieldText.CopyN(raw, kept, 0);
+  ZQGlob::ExternalToInternal(codepage, FieldText);
+  *field = FieldText;
+}
+
+inline void ZQDbase::DecodeText(ZQField* field, const char* raw, int32_t length, int codepage) {
   // Trailing blanks go; they are cut on the record's bytes, so that the text
   // is copied once, and straight into the field when no code page conversion
   // stands between. ASCII is the same in every code page: only text with
   // other bytes goes through the conversion.
   int32_t kept = int32_t(bytescan::TrimRightWide(raw, size_t(length)));
-  if (codepage != 0 && bytescan::HasHighBitWide(raw, size_t(kept))) {
-    FieldText.CopyN(raw, kept, 0);
-    ZQGlob::ExternalToInternal(codepage, FieldText);
-    *field = FieldText;
-  } else {
-    field->AssignText(raw, kept);
-  }
+  if (codepage != 0 && bytescan::HasHighBitWide(raw, size_t(kept))) DecodeCodePage(field, raw, kept, codepage);
+  else field->AssignText(raw, kept);
 }
 
 BATCHERR ZQDbase::GetRecord(ZQRecord& record, int32_t n, int64_t* position, bool withInfo) {

@@ -95,6 +95,8 @@ class ZQ_EXPORT ZQDbase : public ZQDbaseOptions {
   // The decoding of C, N, F, D, L and unknown letters: trailing blanks cut,
   // the code page converted, the text assigned.
   void DecodeText(ZQField* field, const char* raw, int32_t length, int codepage);
+  // DecodeText's conversion of `kept` bytes that are not all ASCII.
+  void DecodeCodePage(ZQField* field, const char* raw, int32_t kept, int codepage);
   void CloseFile(const ZQConnTarget* target);
   bool IsMemoType(int type) const;
   BATCHERR GetMemoField(ZQField* field, const ZQString& pointer, bool withInfo);

@@ -59,15 +59,18 @@ void OutBuf::PutDate(int32_t y, int32_t m, int32_t d) {
     Commit(size_t(snprintf(p, 16, "%04d-%02d-%02d", int(y % 10000), int(m % 100), int(d % 100))));
     return;
   }
-  p[0] = char('0' + y / 1000);
-  p[1] = char('0' + y / 100 % 10);
-  p[2] = char('0' + y / 10 % 10);
-  p[3] = char('0' + y % 10);
+  // Two digits at a time from a table of "00" to "99".
+  static constexpr struct Pairs {
+    char at[200];
+    constexpr Pairs() : at() {
+      for (int i = 0; i < 100; ++i) at[2 * i] = char('0' + i / 10), at[2 * i + 1] = char('0' + i % 10);
+    }
+  } kPairs;
+  memcpy(p, kPairs.at + 2 * (y / 100), 2);
+  memcpy(p + 2, kPairs.at + 2 * (y % 100), 2);
   p[4] = '-';
-  p[5] = char('0' + m / 10);
-  p[6] = char('0' + m % 10);
+  memcpy(p + 5, kPairs.at + 2 * m, 2);
   p[7] = '-';
-  p[8] = char('0' + d / 10);
-  p[9] = char('0' + d % 10);
+  memcpy(p + 8, kPairs.at + 2 * d, 2);
   Commit(10);
 }

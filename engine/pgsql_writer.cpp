@@ -116,37 +116,39 @@ class PgsqlWriter : public RecordWriter {
   // blanks, a sign, digits, a point, an exponent), else NULL: text that
   // isn't a number would fail the whole COPY.
   void PutNumber(const char* s, size_t n) {
-    if (IsJsonNumber(s, n)) {
-      out_.Put(s, n);
-      return;
-    }
-    // Forms JSON refuses but PostgreSQL reads: "+5", ".5", "5.", "007".
-    size_t i = s[0] == '+' || s[0] == '-' ? 1 : 0, digits = 0, points = 0;
+    // A sign, digits and at most one point, the form a table holds (and
+    // forms JSON refuses but PostgreSQL reads: "+5", ".5", "5.", "007");
+    // else JSON's forms, which add exponents.
+    size_t i = n > 0 && (s[0] == '+' || s[0] == '-') ? 1 : 0, digits = 0, points = 0;
     for (size_t k = i; k < n; ++k) {
-      if (s[k] >= '0' && s[k] <= '9') ++digits;
+      if (unsigned(uint8_t(s[k])) - '0' <= 9) ++digits;
       else if (s[k] == '.') ++points;
       else digits = 0, k = n;
     }
-    if (n > i && digits > 0 && points <= 1 && digits + points == n - i) out_.Put(s, n);
+    if ((digits > 0 && points <= 1 && digits + points == n - i) || IsJsonNumber(s, n)) out_.Put(s, n);
     else out_.Put("\\N", 2);
   }
 
   // True when the `n` bytes of `p` need no escape: no control byte, no
-  // backslash, no DEL and nothing beyond ASCII. Eight bytes a step.
+  // backslash, no DEL and nothing beyond ASCII. Eight bytes a step, the
+  // last step overlapping the one before.
   static bool PlainAscii(const char* p, size_t n) {
     using namespace bytescan;
-    size_t i = 0;
-    for (; i + 8 <= n; i += 8) {
-      uint64_t v = Load64(p + i);
-      // A byte below 0x20 borrows when 0x20 is taken from it; the high bit
-      // catches 0x80 and up; DEL and backslash by their values.
-      if ((((v - kOnes * 0x20) & ~v) | v) & kHighs || HasByte(v, 0x7F) || HasByte(v, '\\')) return false;
+    // A byte below 0x20 borrows when 0x20 is taken from it; the high bit
+    // catches 0x80 and up; DEL and backslash by their values.
+    auto plain = [](uint64_t v) {
+      return ((((v - kOnes * 0x20) & ~v) | v) & kHighs) == 0 && !HasByte(v, 0x7F) && !HasByte(v, '\\');
+    };
+    if (n < 8) {
+      for (size_t i = 0; i < n; ++i) {
+        unsigned char c = static_cast<unsigned char>(p[i]);
+        if (c < 0x20 || c >= 0x7F || c == '\\') return false;
+      }
+      return true;
     }
-    for (; i < n; ++i) {
-      unsigned char c = static_cast<unsigned char>(p[i]);
-      if (c < 0x20 || c >= 0x7F || c == '\\') return false;
-    }
-    return true;
+    for (size_t i = 0; i + 8 < n; i += 8)
+      if (!plain(Load64(p + i))) return false;
+    return plain(Load64(p + n - 8));
   }
 
   void PutText(const char* s, size_t n) {

@@ -170,6 +170,20 @@ class Suite:
             return zrows
         return []
 
+    def check_clean(self, label, table, *opts, finds=None):
+        """`zqdb check` finds nothing in `table`, its memo file and its
+        indexes: exit 0 and one line, the summary that says clean (stderr
+        may tell how the table is read). With `finds`: exit 1 and a finding
+        that holds that text."""
+        rc, out, err = run([ZQDB, "check", table, *opts])
+        lines = out.splitlines()
+        if finds is None:
+            ok = rc == 0 and len(lines) == 1 and ": clean (" in lines[0]
+        else:
+            ok = rc == 1 and any(finds in line for line in lines[:-1])
+        return self.check(label + (" check clean" if finds is None else " check finds " + finds), ok,
+                          "exit %d: %s %s" % (rc, " | ".join(lines[:6]), err.strip()[-300:]))
+
     def done(self):
         print("%s: %d passed, %d failed" % (self.name, self.passed, self.failed))
         sys.exit(1 if self.failed else 0)

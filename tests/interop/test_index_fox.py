@@ -179,6 +179,7 @@ def perl_files(d):
             idx = os.path.join(d, "pi%d.idx" % n)
             must(["perl", "-e", PERL_IDX, table, idx])
             same_walk(label, table, idx, None, n, "--dialect", "foxpro")
+            s.check_clean(label, table, "--index", idx, "--dialect", "foxpro")
 
     # An empty CDX with tag K, of a table with no records.
     write_rows(os.path.join(d, "empty.csv"), "ID,K,G", [])
@@ -190,6 +191,7 @@ def perl_files(d):
             perl_insert(empty, table)
             s.check(label + " depth", levels(table[:-4] + ".cdx", FIRST_TAG) == (1 if n < 100 else 2))
             same_walk(label, table, table[:-4] + ".cdx", "K", n)
+            s.check_clean(label, table)
 
     with s.case("python3-dbf's table"):
         table = os.path.join(d, "py.dbf")
@@ -206,6 +208,7 @@ def perl_files(d):
         same_walk("python3-dbf's table", table, table[:-4] + ".cdx", "K", len(keys) + len(more))
         s.check("python3-dbf's table keys", sorted(zq_keys(table, "K")) == sorted(
             (k, r) for r, k in enumerate(keys + more, 1)))
+        s.check_clean("python3-dbf's table", table)
 
 
 def perl_insert(empty, table):

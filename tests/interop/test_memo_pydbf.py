@@ -52,5 +52,6 @@ with workdir() as d:
             got = [r["NOTE"] for r in rows]
             s.check(label + " memo text", [g or None for g in got] == [w or None for w in want],
                     repr([(g or "")[:30] for g in got]))
+        s.check_clean(label, path, *opts)
 
 s.done()

@@ -66,6 +66,7 @@ with workdir() as d:
                 s.check(label + " version byte", f.read(1)[0] == byte)
             rows = s.compare_table(label, path, [], "ascii", expect_live=4)
             check_memos(label, rows)
+            s.check_clean(label, path)
 
     # dBASE IV DBT. Perl XBase leaves the memo header's version word (offset
     # 18) at zero, and zqdb accepts only 0x0101 and 0x0102 there: the memo
@@ -84,6 +85,8 @@ with workdir() as d:
         blank = sum(1 for m in MEMOS if m)
         s.check("--memo errors counts the memos left blank",
                 rc == 0 and ("%d memos were left blank under --memo errors" % blank) in err, "exit %d: %s" % (rc, err))
+        rc, out, _ = run([ZQDB, "check", db4])
+        s.check("dBASE IV DBT without version word found by check", rc == 1 and out.startswith("memo: the memo file"), out)
         s.compare_table("dBASE IV DBT ignored", db4, ["--memo", "errors"], "ascii",
                         ref_fix=lambda k, v: None if k == "NOTE" else v, expect_live=4)
         # With the version word of a dBASE IV memo file, 0x0101, the memos read.
@@ -92,6 +95,7 @@ with workdir() as d:
             f.write(b"\x01\x01")
         rows = s.compare_table("dBASE IV DBT", db4, [], "ascii", ref_fix=fix, expect_live=4)
         check_memos("dBASE IV DBT", rows)
+        s.check_clean("dBASE IV DBT", db4)
         # The memo policy "always" leaves every memo blank.
         rows = zqdb_rows(db4, "--memo", "always")
         s.check("--memo always", [r["NOTE"] for r in rows] == [None] * 4, repr(rows))

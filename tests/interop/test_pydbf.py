@@ -48,6 +48,7 @@ with workdir() as d:
         s.check("dBASE III leading blanks stripped by the writer", rows[1]["NAME"] == "Ørsted", repr(rows[1]["NAME"]))
         rc, out, _ = run([ZQDB, "cat", db3, "--format", "jsonl", "--codepage", "850"])
         s.check("N keeps the table's digits", '"PRICE":12.50' in out and '"PRICE":-0.75' in out, out.splitlines()[0])
+    s.check_clean("dBASE III", db3)
 
     # Without --codepage the language driver byte python3-dbf writes (0x02)
     # names code page 850; --codepage 0 passes the bytes unconverted.
@@ -72,6 +73,7 @@ with workdir() as d:
                     ref_fix=no_memo, expect_live=3)
     s.compare_table("FoxPro by dialect name", fp, ["--codepage=1252", "--memo=always", "--dialect", "foxpro"],
                     "cp1252", ref_fix=no_memo, expect_live=3)
+    s.check_clean("FoxPro", fp)
 
     # Visual FoxPro with the binary types I, Y, T and B.
     vfp = os.path.join(d, "vfp.dbf")
@@ -92,6 +94,7 @@ with workdir() as d:
     if rows:
         s.check("Y is scaled by 10000", rows[0]["PRICE"] == decimal.Decimal("12.3456"), repr(rows[0]["PRICE"]))
         s.check("I is signed", rows[2]["COUNT"] == -2147483647, repr(rows[2]["COUNT"]))
+    s.check_clean("Visual FoxPro", vfp, "--dialect", "10")
     # Read as dBASE IV, a Visual FoxPro table is refused.
     rc, _, err = run([ZQDB, "cat", vfp, "--dialect", "2", "--format", "jsonl", "--memo", "errors"])
     s.check("0x30 refused outside dialect 10", rc == 1 and "Error opening data file" in err, "exit %d %s" % (rc, err))
@@ -100,6 +103,7 @@ with workdir() as d:
     empty = os.path.join(d, "empty.dbf")
     write(empty, "A C(5); B N(3,0)", "db3", "cp1252", [])
     s.compare_table("empty dBASE III", empty, [], "cp1252", expect_live=0)
+    s.check_clean("empty dBASE III", empty)
 
 # A Clipper table of python3-dbf with a C field of 5,000 bytes, its length's
 # high byte in the decimals byte: read whole, and the field behind it from the
@@ -115,5 +119,6 @@ with workdir() as d:
     rows = s.compare_table("C(5000)", long_c, [], "ascii", expect_live=2)
     if rows:
         s.check("C(5000) whole", rows[0]["NAME"] == "x" * 4999 + "y" and rows[0]["QTY"] == 7, repr(rows[0])[:80])
+    s.check_clean("C(5000)", long_c)
 
 s.done()

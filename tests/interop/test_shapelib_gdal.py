@@ -28,6 +28,7 @@ with workdir() as d:
                     ["東京", "0", "0", ""], ["x" * 24, "999999", "99999999.999", "xyz"]):
             must(["dbfadd", shp] + row)
     rows = s.compare_table("shapelib", shp, ["--codepage", "utf-8"], "utf-8", expect_live=4)
+    s.check_clean("shapelib", shp)
     if rows:
         s.check("shapelib leading blanks kept", rows[0]["NAME"] == "  lead", repr(rows[0]["NAME"]))
         s.check("shapelib UTF-8 text", rows[1]["NAME"] == "Müller, \"Zoë\"" and rows[2]["NAME"] == "東京",
@@ -43,6 +44,7 @@ with workdir() as d:
         must(["dbfcreate", wide] + args)
         must(["dbfadd", wide] + ["v%d" % (i % 10) for i in range(1, 301)])
     rows = s.compare_table("shapelib 300 fields", wide, [], "ascii", expect_live=1)
+    s.check_clean("shapelib 300 fields", wide)
     if rows:
         s.check("the 300th field", rows[0]["F300"] == "v0", repr(rows[0].get("F300")))
 
@@ -60,6 +62,7 @@ with workdir() as d:
         must(["ogr2ogr", "-f", "ESRI Shapefile", "-oo", "AUTODETECT_TYPE=YES", "-lco", "ENCODING=CP1252",
               gdal, csv])
     rows = s.compare_table("GDAL typed cp1252", gdal, ["--codepage", "1252"], "cp1252", expect_live=4)
+    s.check_clean("GDAL typed", gdal)
     if rows:
         s.check("GDAL text", [r["city"] for r in rows] == ["Århus", "Köln", "", "São Paulo"],
                 repr([r["city"] for r in rows]))
@@ -70,6 +73,7 @@ with workdir() as d:
     with s.case("ogr2ogr plain"):
         must(["ogr2ogr", "-f", "ESRI Shapefile", "-lco", "ENCODING=CP1252", plain, csv])
     s.compare_table("GDAL text columns", plain, ["--codepage", "1252"], "cp1252", expect_live=4)
+    s.check_clean("GDAL text columns", plain)
 
     # The code page of GDAL's tables is in their .cpg file, their language
     # driver byte 0: zqdb finds it without --codepage.
@@ -80,5 +84,6 @@ with workdir() as d:
             with open(path[:-4] + ".cpg") as f:
                 s.check("GDAL .cpg " + enc, f.read().strip() == cpg, path)
         s.compare_table("GDAL %s by its .cpg" % enc, path, [], enc.lower(), expect_live=4)
+        s.check_clean("GDAL " + enc, path)
 
 s.done()

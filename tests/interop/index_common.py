@@ -113,3 +113,43 @@ def check_index(s, label, table, index, tag, entries, *zq_opts):
     bad = [(k, r, f) for (k, r), f in zip(first.items(), found) if f != (k, r)]
     s.check(label + " Perl seek", len(found) == len(first) and not bad, "%d of %d seeks wrong: %s" % (
         len(bad), len(first), bad[:3]))
+
+
+# A key no other key of a stale test shares a prefix with, so that every
+# index kind stores it whole; it sorts last, and stays last when its last
+# byte changes.
+MARKER = "~marker"
+
+
+def stale_table(d, name, n, *opts):
+    """A table of n records over ID, K and G, with K the marker in record
+    n // 2; returns (table, {recno: key})."""
+    keys = {r: ("k%02d" % (r * 7 % n) if r != n // 2 else MARKER) for r in range(1, n + 1)}
+    csv, table = os.path.join(d, name + ".csv"), os.path.join(d, name + ".dbf")
+    write_rows(csv, "ID,K,G", ((r, k, "g") for r, k in keys.items()))
+    must([ZQDB, "convert", csv, table, "--no-progress", "--schema", "ID N(7), K C(10), G C(6)", *opts])
+    return table, keys
+
+
+def stale_and_mended(s, label, table, keys, tag_file, tag, other, appended):
+    """Records that another program appended (`appended`, recno -> key) and
+    the marker's last byte changed in the tag's file and in `other`, an
+    index file named with --index: check names both faults in both, reindex
+    rebuilds them, check is clean, and Perl walks each as zqdb does, one key
+    per record."""
+    for index in (tag_file, other):
+        with open(index, "r+b") as f:
+            data = f.read()
+            f.seek(data.rindex(MARKER.encode()) + len(MARKER) - 1)
+            f.write(b"s")
+    rc, out, err = run([ZQDB, "check", table, "--index", other])
+    for part in (tag, other):
+        for finding in ("has no key in the index", "differs from '%s'" % MARKER):
+            s.check("%s %s finds %s" % (label, part, finding), rc == 1 and any(
+                line.startswith("index %s: record" % part) and finding in line for line in out.splitlines()),
+                "exit %d: %s" % (rc, out[-300:] + err))
+    must([ZQDB, "reindex", table, "--index", tag, "--index", other])
+    s.check_clean(label + " reindexed", table, "--index", other)
+    keys = {**keys, **appended}
+    for index, t in ((tag_file, tag), (other, None)):
+        check_index(s, "%s reindexed %s" % (label, t or "file"), table, index, t, [(k, r) for r, k in keys.items()])

@@ -16,7 +16,11 @@
 4. libxbase64 (a small program compiled here against libxbase64-dev): NDX
    files that it builds over a table zqdb writes are walked by `zqdb keys`,
    forwards and backwards, as libxbase64 walks them, and it walks zqdb's
-   deep NDX file both ways as zqdb does.
+   deep NDX file both ways as zqdb does; check finds nothing in them but
+   what libxbase64 gets wrong.
+5. Stale indexes: records that Perl XBase appends (it keeps no index
+   current) and a key byte changed, in an MDX tag and an NDX file, are found
+   by check and mended by reindex, and Perl walks the rebuilt files as zqdb.
 """
 
 import os
@@ -28,7 +32,8 @@ import sys
 HERE = os.path.dirname(os.path.abspath(__file__))
 sys.path.insert(0, HERE)
 from common import Suite, workdir, ZQDB  # noqa: E402
-from index_common import check_index, draw, first_records, key_pool, must, perl_walk, write_rows, zq_keys  # noqa: E402
+from index_common import (check_index, draw, first_records, key_pool, must, perl_walk, stale_and_mended,  # noqa: E402
+                          stale_table, write_rows, zq_keys)
 
 # (label, records, field width, distinct keys, fewest MDX and NDX levels)
 # A key of 100 bytes leaves 9 entries to an MDX node and 4 to an NDX node,
@@ -227,6 +232,26 @@ def libxbase64_files(d, tool):
             s.check_clean(label, table, "--index", ndx, finds=finding)
 
 
+# --- 5: stale indexes --------------------------------------------------------
+
+# Appends argv[1] records to the table argv[0]: ID 100 + i, K "new" i.
+PERL_APPEND = r'''
+use strict; use XBase;
+my $t = XBase->new($ARGV[0]) or die XBase->errstr;
+for my $i (1 .. $ARGV[1]) { $t->set_record($t->last_record + 1, 100 + $i, "new$i", "p") or die $t->errstr }
+$t->close;
+'''
+
+
+def stale(d):
+    with s.case("stale MDX and NDX"):
+        ndx = os.path.join(d, "stale.ndx")
+        table, keys = stale_table(d, "stale", 30, "--to", "dBASE IV", "--index", "K=K", "--index", ndx + "=K")
+        must(["perl", "-e", PERL_APPEND, table, "20"])
+        stale_and_mended(s, "stale", table, keys, table[:-4] + ".mdx", "K", ndx,
+                         {30 + i: "new%d" % i for i in range(1, 21)})
+
+
 if shutil.which("perl") is None:
     print("index_dbase: perl missing")
     sys.exit(1)
@@ -234,6 +259,7 @@ with workdir() as d:
     xbase64 = xbase64_tool(d)
     character_trees(d, xbase64)
     numeric_keys(d)
+    stale(d)
     if xbase64:
         libxbase64_files(d, xbase64)
 s.done()

@@ -12,7 +12,11 @@
 3. The other way: IDX files that `XBase::idx->create` writes, and CDX tags
    that Perl's `insert` fills in an empty CDX that zqdb made, are walked by
    `zqdb keys` as Perl walks them. A table that python3-dbf wrote, given such
-   a tag, keeps it current when zqdb appends to it.
+   a tag, keeps it current when zqdb appends to it. check finds nothing in
+   them.
+4. Stale indexes: records that python3-dbf appends (it keeps no index
+   current) and a key byte changed, in a CDX tag and an IDX file, are found
+   by check and mended by reindex, and Perl walks the rebuilt files as zqdb.
 (No program here reads compact IDX files; the unit tests check those.)
 """
 
@@ -26,7 +30,8 @@ import sys
 HERE = os.path.dirname(os.path.abspath(__file__))
 sys.path.insert(0, HERE)
 from common import Suite, workdir, ZQDB  # noqa: E402
-from index_common import check_index, draw, key_pool, must, perl_walk, write_rows, zq_keys  # noqa: E402
+from index_common import (check_index, draw, key_pool, must, perl_walk, stale_and_mended, stale_table,  # noqa: E402
+                          write_rows, zq_keys)
 
 import dbf  # noqa: E402
 
@@ -220,10 +225,25 @@ def perl_insert(empty, table):
         raise AssertionError("perl insert: " + p.stderr.decode(errors="replace")[-400:])
 
 
+def stale(d):
+    with s.case("stale CDX and IDX"):
+        idx = os.path.join(d, "stale.idx")
+        table, keys = stale_table(d, "stale", 30, "--to", "foxpro", "--index", "K=K", "--index", idx + "=K",
+                                  "--index-form", "plain")
+        t = dbf.Table(table)
+        t.open(dbf.READ_WRITE)
+        for i in range(1, 21):
+            t.append((100 + i, "py%d" % i, "q"))
+        t.close()
+        stale_and_mended(s, "stale", table, keys, table[:-4] + ".cdx", "K", idx,
+                         {30 + i: "py%d" % i for i in range(1, 21)})
+
+
 if shutil.which("perl") is None:
     print("index_fox: perl missing")
     sys.exit(1)
 with workdir() as d:
     character_trees(d)
     perl_files(d)
+    stale(d)
 s.done()

@@ -153,7 +153,7 @@ __attribute__((noinline)) void ZQDbase::DecodeCodePage(ZQField* field, const cha
   *field = FieldText;
 }
 
-inline void ZQDbase::DecodeText(ZQField* field, const char* raw, int32_t length, int codepage) {
+__attribute__((always_inline)) inline void ZQDbase::DecodeText(ZQField* field, const char* raw, int32_t length, int codepage) {
   // Trailing blanks go; they are cut on the record's bytes, so that the text
   // is copied once, and straight into the field when no code page conversion
   // stands between. ASCII is the same in every code page: only text with

@@ -94,7 +94,7 @@ CodePageChoice ChooseCodePage(const std::string& path, int given) {
   }
   if (c.driver > 0) {
     int cp = CodePageOfDriver(uint8_t(c.driver));
-    char hex[8];
+    char hex[16];
     snprintf(hex, sizeof hex, "0x%02X", unsigned(c.driver));
     if (cp != 0 && Supported(cp)) {
       c.codepage = cp;

@@ -266,7 +266,7 @@ class MemoCheck {
       bytes = length < 0 ? 0 : length;
     } else {
       uint8_t head[kMemoBlockHead];
-      if (!ReadAt(fd_, at, head, sizeof head)) {
+      if (!ReadWindowed(at, head, sizeof head)) {
         past = "block head runs past the end of the memo file";
         bytes = size_ - at;
       } else if (kind_ == MEMO_FPT) {
@@ -285,6 +285,26 @@ class MemoCheck {
     }
     int64_t span = bytes <= 0 ? 1 : (bytes + block_ - 1) / block_;
     spans_.push_back({block, block + span, record});
+  }
+
+  // Reads `n` bytes at `at` through a window of the file: memos mostly lie
+  // in the order of their records, so one read serves the heads of many
+  // (one read per memo would be a system call per record). False when the
+  // file holds fewer.
+  bool ReadWindowed(int64_t at, void* out, size_t n) {
+    if (at < window_at_ || at + int64_t(n) > window_at_ + int64_t(window_.size())) {
+      constexpr int64_t kWindow = 64 << 10;
+      const int64_t want = std::min<int64_t>(kWindow, size_ - at);
+      if (want < int64_t(n)) return false;
+      window_.resize(size_t(want));
+      if (!ReadAt(fd_, at, window_.data(), window_.size())) {
+        window_.clear();
+        return false;
+      }
+      window_at_ = at;
+    }
+    memcpy(out, window_.data() + (at - window_at_), n);
+    return true;
   }
 
   // Bytes of a dBASE III memo up to and with its 0x1A, or -1 when the file
@@ -336,6 +356,8 @@ class MemoCheck {
   int fd_ = -1;
   int64_t size_ = -1;
   std::vector<MemoSpan> spans_;
+  std::vector<char> window_;  // bytes of the file from window_at_
+  int64_t window_at_ = 0;
 };
 
 // ---------------------------------------------------------------------------

@@ -413,7 +413,8 @@ void CheckIndex(OpenedIndex& ix, const std::vector<uint8_t>& flags, int64_t head
                 Findings* findings) {
   const std::string part = "index " + ix.name;
   ZQString tree;
-  if (ix.walk->CheckTree(tree) > 0) {
+  const int32_t tree_faults = ix.walk->CheckTree(tree);
+  if (tree_faults > 0) {
     std::string all(tree.c_str(), size_t(tree.length()));
     size_t start = 0;
     while (start < all.size()) {
@@ -440,7 +441,9 @@ void CheckIndex(OpenedIndex& ix, const std::vector<uint8_t>& flags, int64_t head
   // wait for the end of the walk to know which.
   std::vector<std::pair<int64_t, std::string>> disorder;
   size_t bytes_disordered = 0, values_disordered = 0;
+  int64_t walked = 0;
   for (int32_t r = ix.walk->First(key); r != -1; r = ix.walk->Next(key)) {
+    ++walked;
     if (!first && key < prev && ++bytes_disordered <= kShownPerPart)
       disorder.emplace_back(int64_t(r) + 1, "key " + Shown(key.c_str(), size_t(key.length())) +
                                                 " stands after the greater key " +
@@ -475,6 +478,11 @@ void CheckIndex(OpenedIndex& ix, const std::vector<uint8_t>& flags, int64_t head
     // Beyond those listed, counted only.
     for (size_t i = disorder.size(); i < bytes_disordered; ++i) findings->Record(part, -1, "a key out of order");
   }
+  // The faults of the tree's structure say where a broken walk stopped.
+  if (tree_faults == 0 && ix.walk->Broken())
+    findings->Add(part, -1, -1, -1,
+                  "the walk in key order stopped at damage after " + std::to_string(walked) +
+                      (walked == 1 ? " key" : " keys"));
   for (size_t r = 0; r < records; ++r) {
     if (flags[r] != kLiveFlag) continue;
     if (counts[r] > 1) {
@@ -510,8 +518,8 @@ void PutJsonNumber(OutBuf& out, const char* name, int64_t v) {
   out.PutInt(v);
 }
 
-bool Write(const std::string& table, const Findings& findings, const std::string& summary, bool json) {
-  OutBuf out(STDOUT_FILENO);
+bool Write(const std::string& table, const Findings& findings, const std::string& summary, bool json, int fd) {
+  OutBuf out(fd);
   if (json) {
     out.Put("{\"table\": ");
     PutJsonString(out, table.data(), table.size());
@@ -736,6 +744,6 @@ int RunCheck(const std::string& table, const SourceOptions& source, const CheckR
   if (memo) summary += ", the memo file";
   if (!names.empty() && kind != IndexKind::kNone)
     summary += ", " + std::to_string(names.size()) + (names.size() == 1 ? " index" : " indexes");
-  if (!Write(table, findings, summary, opts.json)) return Fail("cannot write the output");
+  if (!Write(table, findings, summary, opts.json, opts.out)) return Fail("cannot write the output");
   return findings.total() == 0 ? 0 : 1;
 }

@@ -11,6 +11,7 @@
 struct CheckRunOptions {
   std::vector<std::string> indexes;  // .ndx/.idx files named with --index, beside the table's own tags
   bool json = false;
+  int out = 1;  // where the findings go: standard output
 };
 
 // Reads everything and writes the findings, one line each (or one JSON

@@ -1,6 +1,6 @@
-// NDX files and MDX tags from fuzzed bytes: open, walk every key forwards
-// (and backwards where the kind can), search, then add keys to the damaged
-// tree. Input: one byte that picks the kind (even NDX, odd MDX), then the file.
+// NDX files and MDX tags from fuzzed bytes: open, check the tree's
+// structure, walk every key forwards (and backwards where the kind can),
+// search, then add keys to the damaged tree. Input: one byte that picks the kind (even NDX, odd MDX), then the file.
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -19,6 +19,8 @@ namespace {
 void Exercise(ZQDBMdx& ix, bool backwards) {
   if (!ix.OK()) return;
   ZQString key;
+  ZQString faults;
+  ix.CheckTree(faults);
   int n = 0;
   for (int32_t r = ix.FirstKey(key); r != -1 && n < 200000; r = ix.NextKey(key)) ++n;
   if (backwards)

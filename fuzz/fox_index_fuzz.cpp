@@ -1,7 +1,8 @@
 // FoxPro index files from fuzzed bytes: an IDX file, or a CDX file with its
-// tag list and tags. Each index is opened, walked forwards whole, searched,
-// walked backwards, and given a few keys on the scratch copy. Input: one byte
-// that picks the kind (even: IDX, odd: CDX), then the file.
+// tag list and tags. Each index is opened, its tree's structure checked, and
+// walked forwards whole, searched, walked backwards, and given a few keys on
+// the scratch copy. Input: one byte that picks the kind (even: IDX, odd:
+// CDX), then the file.
 #include <cstddef>
 #include <cstdint>
 #include <string>
@@ -16,6 +17,8 @@ constexpr int kMaxTags = 8;
 
 void Exercise(ZQDBFoxIndex& ix) {
   if (!ix.OK()) return;
+  ZQString faults;
+  ix.CheckTree(faults);
   ZQString key, first;
   int steps = 0;
   for (int32_t r = ix.FirstKey(key); r != -1 && steps < kMaxSteps; r = ix.NextKey(key), ++steps)

@@ -49,9 +49,12 @@ class ZQ_EXPORT ZQDBIndexBase {
   // True when the last walk ended at damage (a block that couldn't be read,
   // a walk longer than the file can hold) rather than at its last key.
   bool Broken() const;
-  // Walks every block of the tree from the root and appends a line
-  // "block N: what is wrong" to `findings` for each fault of structure. The
-  // number of faults; 0 for kinds that have no such walk.
+  // Walks every block of the tree from the root, as the file holds it (an
+  // index that was given keys may hold changed blocks that aren't written
+  // yet), and appends a line "block N: what is wrong" to `findings` for each
+  // fault of structure; N counts 512-byte units in every kind. Reads only,
+  // bounded by the file's size. The number of faults; 0 for an index that
+  // isn't open.
   virtual int32_t CheckTree(ZQString& findings) {
     (void)findings;
     return 0;

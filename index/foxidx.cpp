@@ -3,6 +3,7 @@
 #include "index/foxidx.h"
 
 #include <climits>
+#include <cstdio>
 #include <cstring>
 #include <new>
 
@@ -1101,4 +1102,110 @@ bool ZQDBFoxNode::WriteChain() {
   bool good = !dirty || !valid || WriteNode();
   if (child != nullptr) good = static_cast<ZQDBFoxNode*>(child)->WriteChain() && good;
   return good;
+}
+
+// ---------------------------------------------------------------------------
+// Checking the tree's structure
+
+int32_t ZQDBFoxIndex::CheckTree(ZQString& findings) {
+  if (!ok || fd < 0 || root == nullptr) return 0;
+  ZQTreeCheck check(findings, _lseek(fd, 0, 2), keyLength);
+  if (!check.Ready()) return check.Finish();
+  // A node object of this index, cut loose from the chain, reads each block
+  // as the walk in key order does; it is never dirty, so it writes nothing.
+  auto* probe = new (std::nothrow) ZQDBFoxNode(*static_cast<ZQDBFoxNode*>(root));
+  if (probe == nullptr) {
+    check.Fault(-1, "not enough memory to walk the tree");
+    return check.Finish();
+  }
+  probe->child = nullptr;
+  probe->parent = nullptr;
+  probe->cdxAttr = false;
+  probe->Invalidate();
+  if (CheckLink(check, headerWhere / ZQDBFoxNode::kBlock, -1, rootWhere, 0))
+    CheckNode(check, *probe, rootWhere, 0, -1, {}, {});
+  delete probe;
+  return check.Finish();
+}
+
+bool ZQDBFoxIndex::CheckLink(ZQTreeCheck& check, int32_t from, int entry, int32_t at, int depth) const {
+  const int32_t block = ZQDBFoxNode::kBlock;
+  char name[40];
+  if (entry < 0) snprintf(name, sizeof name, "the root link");
+  else snprintf(name, sizeof name, "entry %d", entry);
+  // The header at the start of the file (a CDX's tag list is compact, as
+  // its tags are) and this index's own.
+  const int32_t header = compact ? kHeaderCompact : kHeaderPlain;
+  const char* problem = nullptr;
+  if (at < 0 || int64_t(at) + block > int64_t(check.Units()) * block) problem = "which lies past the end of the file";
+  else if (at % block != 0) problem = "which is not on a 512-byte block boundary";
+  else if (at < header || (at >= headerWhere && at < headerWhere + header)) problem = "which lies in an index header";
+  if (problem == nullptr) return true;
+  if (at >= 0 && at % block == 0)
+    check.Fault(from, "%s names block %d, %s", name, at / block, problem);
+  else
+    check.Fault(from, "%s names offset %d, %s", name, at, problem);
+  check.LoseLevels(depth);
+  return false;
+}
+
+void ZQDBFoxIndex::CheckNode(ZQTreeCheck& check, ZQDBFoxNode& probe, int32_t at, int depth, int32_t parent,
+                             ZQTreeCheck::Bound lo, ZQTreeCheck::Bound hi) {
+  const int32_t block = at / ZQDBFoxNode::kBlock;
+  if (!check.Reach(block, parent)) {
+    check.LoseLevels(depth);
+    return;
+  }
+  if (depth > ZQTreeCheck::kLevels) {
+    check.Fault(block, "lies more than %d levels below the root, deeper than any tree of this kind",
+                ZQTreeCheck::kLevels);
+    check.LoseLevels(depth);
+    return;
+  }
+  if (probe.ReadNode(at) < 0) {
+    // What ReadNode refused, from the block it read.
+    const uint8_t* raw = probe.raw;
+    const bool leaf = (GetLe16(raw + kBlkAttr) & kAttrLeaf) != 0;
+    const int count = int16_t(GetLe16(raw + kBlkCount));
+    const int room = leaf && compact ? ZQDBFoxNode::kMaxLeafKeys
+                                     : ZQDBFoxNode::kArea / (keyLength + (leaf || !compact ? 4 : 8));
+    if (count < 0 || count > room) check.Fault(block, "holds %d keys, more than the %d it has room for", count, room);
+    else if (!leaf && count == 0) check.Fault(block, "an interior block with no keys");
+    else check.Fault(block, "its compact leaf header or key entries make no sense: its keys can't be rebuilt");
+    check.LoseLevels(depth);
+    return;
+  }
+  const int n = probe.keyCount;
+  // One writer (Perl XBase) leaves 0 for "none" in the links of a root it
+  // made; no block can stand at offset 0, and nothing follows a root's links.
+  const int32_t left = depth == 0 && probe.leftSibling == 0 ? -1 : probe.leftSibling;
+  const int32_t right = depth == 0 && probe.rightSibling == 0 ? -1 : probe.rightSibling;
+  if (probe.IsLeaf()) {
+    check.Keys(block, n, probe.KeyBytes(0), probe.CompactLeaf() ? keyLength : probe.EntrySize(), lo, hi);
+    if (!check.Leaf(block, depth)) {
+      check.LoseLevels(depth);
+      return;
+    }
+    check.Siblings(depth, at, left, right);
+    return;
+  }
+  // The entries stay here while the probe reads the blocks below.
+  uint8_t* p = check.Buffer(depth, ZQDBFoxNode::kBlock);
+  if (p == nullptr) {
+    check.Fault(block, "not enough memory to walk the tree this deep");
+    check.LoseLevels(depth);
+    return;
+  }
+  memcpy(p, probe.raw, ZQDBFoxNode::kBlock);
+  const int size = probe.EntrySize();
+  const uint8_t* entries = p + ZQDBFoxNode::kHeader;
+  check.Keys(block, n, entries, size, lo, hi);
+  check.Siblings(depth, at, left, right);
+  for (int i = 0; i < n; ++i) {
+    const uint8_t* e = entries + i * size;
+    const int32_t child = int32_t(GetBe32(e + size - 4));
+    ZQTreeCheck::Bound below = i > 0 ? ZQTreeCheck::Bound{e - size, block} : lo;
+    if (CheckLink(check, block, i, child, depth + 1))
+      CheckNode(check, probe, child, depth + 1, block, below, ZQTreeCheck::Bound{e, block});
+  }
 }

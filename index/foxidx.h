@@ -36,6 +36,7 @@
 #include <cstdint>
 
 #include "index/dbindex.h"
+#include "index/tree_check.h"
 
 class ZQDBFoxNode;
 
@@ -80,6 +81,13 @@ class ZQ_EXPORT ZQDBFoxIndex : public ZQDBIndexBase {
   const char* Reason() const { return reason; }
   // Writes the header and every changed block now. False if a write failed.
   bool Flush();
+  // Walks every block of the tree once: each lies in the file on a block
+  // boundary outside the index headers and is reached from one parent, holds
+  // no more keys than its block has room for (an interior block at least
+  // one), in order and within the keys its parent holds for it; the leaves
+  // lie at one depth, and the sibling links of each level follow its blocks
+  // in key order, with none outside the first and the last.
+  int32_t CheckTree(ZQString& findings) override;
 
  private:
   ZQDBFoxIndex();
@@ -91,6 +99,12 @@ class ZQ_EXPORT ZQDBFoxIndex : public ZQDBIndexBase {
   void CreateTag(const char* path, const char* name, int32_t length, const ZQRecord& keyfields,
                  const ZQIndexDef& def, ZQDBFoxIndex*& taglist);
   bool Fail(const char* why);
+  // CheckTree: whether the link `entry` of block `from` (-1: the header's
+  // root link) names a place a block can be in (told if not); and the walk
+  // of the subtree at byte offset `at`, with `probe` reading its blocks.
+  bool CheckLink(ZQTreeCheck& check, int32_t from, int entry, int32_t at, int depth) const;
+  void CheckNode(ZQTreeCheck& check, ZQDBFoxNode& probe, int32_t at, int depth, int32_t parent,
+                 ZQTreeCheck::Bound lo, ZQTreeCheck::Bound hi);
 
   int32_t headerWhere = 0;
   int32_t rootWhere = 0;

@@ -20,6 +20,7 @@
 #include <cstdint>
 
 #include "index/dbindex.h"
+#include "index/tree_check.h"
 
 // MDX file header.
 constexpr int32_t kMdxVersion = 0, kMdxCreated = 1, kMdxDataName = 4, kMdxBlockUnits = 20,
@@ -65,6 +66,14 @@ class ZQ_EXPORT ZQDBMdx : public ZQDBIndexBase {
   char KeyType() const { return keyType; }
   int16_t KeyLength() const { return keyLength; }
 
+  // Walks every block of the tree once: each lies in the file on a block
+  // boundary and is reached from one parent, holds no more keys than its
+  // block has room for, in order and within the keys its parent holds for
+  // it; the leaves lie at one depth, and only the root may be an empty leaf.
+  // For an MDX tag, the file header's next free block and the tag's block
+  // count lie beyond the blocks the tree uses.
+  int32_t CheckTree(ZQString& findings) override;
+
  private:
   friend class ZQDBMdxNode;
   friend class ZQDBNdxNode;
@@ -73,6 +82,13 @@ class ZQ_EXPORT ZQDBMdx : public ZQDBIndexBase {
   bool BuildMdxFile(const char* path, const char* tag, const ZQRecord& fields, ZQIndexDef* def);
   bool BuildNdxFile(const ZQRecord& fields, ZQIndexDef* def);
   void UpdateDescriptions(int count, ZQString& table);
+  // CheckTree: whether the link `entry` of block `from` (-1: the header's
+  // root link; the key count: the last child link) names a block a node can
+  // be in (told if not); and the walk of the subtree at `block`, which
+  // raises `end` to the unit behind each block and counts the blocks.
+  bool CheckLink(ZQTreeCheck& check, int32_t from, int entry, int keys, int32_t block) const;
+  void CheckNode(ZQTreeCheck& check, int32_t block, int depth, int32_t parent, ZQTreeCheck::Bound lo,
+                 ZQTreeCheck::Bound hi, int32_t& end, int32_t& nodes);
 
   int32_t maxKeys = 0;
   int32_t rootOffset = 0;

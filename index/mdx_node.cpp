@@ -1,5 +1,7 @@
 // The B-tree nodes of MDX tags and NDX files: reading, walking, adding keys
-// with the splits on the way down, and writing blocks.
+// with the splits on the way down, writing blocks, and checking the whole
+// tree's structure.
+#include <cstdio>
 #include <cstring>
 #include <new>
 
@@ -413,4 +415,121 @@ bool ZQDBMdxNode::ChildSplit(const ZQString& key) {
   current = pos + 1;
   if (midKey >= key) current = pos;
   return c->Move(ChildAt(current));
+}
+
+// ---------------------------------------------------------------------------
+// Checking the tree's structure
+
+namespace {
+
+// The first block a node can be in: behind the tag table of an MDX file,
+// behind the header block of an NDX file.
+constexpr int32_t kMdxFirstNodeBlock = 2048 / kUnit, kNdxFirstNodeBlock = 1;
+
+// "entry 3", "the last child link" or "the root link", for people.
+const char* LinkName(int entry, int keys, char (&out)[40]) {
+  if (entry < 0) return "the root link";
+  if (entry >= keys) return "the last child link";
+  snprintf(out, sizeof out, "entry %d", entry);
+  return out;
+}
+
+}  // namespace
+
+int32_t ZQDBMdx::CheckTree(ZQString& findings) {
+  if (!ok || fd == -1 || root == nullptr) return 0;
+  ZQTreeCheck check(findings, _lseek(fd, 0, 2), keyLength);
+  if (!check.Ready()) return check.Finish();
+  const int32_t header = isMdx ? headerBlock : 0;
+  const int32_t rootBlock = rootOffset / kUnit;
+  int32_t end = 0, nodes = 0;
+  if (CheckLink(check, header, -1, 0, rootBlock)) CheckNode(check, rootBlock, 0, -1, {}, {}, end, nodes);
+  if (isMdx) {
+    // New blocks go where the file header's next free block says, for other
+    // programs; one that lies inside the tree would be overwritten.
+    uint8_t next[4];
+    if (_lseek(fd, kMdxNextFree, 0) == kMdxNextFree && _read(fd, next, 4) == 4 && int32_t(GetLe32(next)) < end)
+      check.Fault(0, "the file header's next free block %d lies inside this tag's tree, whose blocks reach block %d",
+                  int32_t(GetLe32(next)), end - 1);
+    if (int64_t(blockCount) < int64_t(nodes) * blockUnits)
+      check.Fault(header, "the tag header counts %d units of blocks, fewer than the %d of the %d blocks its tree uses",
+                  blockCount, nodes * blockUnits, nodes);
+  }
+  return check.Finish();
+}
+
+bool ZQDBMdx::CheckLink(ZQTreeCheck& check, int32_t from, int entry, int keys, int32_t block) const {
+  char name[40];
+  const int32_t first = isMdx ? kMdxFirstNodeBlock : kNdxFirstNodeBlock;
+  if (block >= 0 && block < first) {
+    check.Fault(from, "%s names block %d, which lies in the file's header", LinkName(entry, keys, name), block);
+    return false;
+  }
+  if (block < 0 || int64_t(block) * kUnit + blockSize > int64_t(check.Units()) * kUnit) {
+    check.Fault(from, "%s names block %d, which lies past the end of the file (%d blocks of 512 bytes)",
+                LinkName(entry, keys, name), block, check.Units());
+    return false;
+  }
+  if ((block - first) % blockUnits != 0) {
+    check.Fault(from, "%s names block %d, which is not on a block boundary (blocks of %d units begin at block %d)",
+                LinkName(entry, keys, name), block, blockUnits, first);
+    return false;
+  }
+  return true;
+}
+
+void ZQDBMdx::CheckNode(ZQTreeCheck& check, int32_t block, int depth, int32_t parent, ZQTreeCheck::Bound lo,
+                        ZQTreeCheck::Bound hi, int32_t& end, int32_t& nodes) {
+  if (!check.Reach(block, parent)) return;
+  if (depth > ZQTreeCheck::kLevels) {
+    check.Fault(block, "lies more than %d levels below the root, deeper than any tree of this kind",
+                ZQTreeCheck::kLevels);
+    return;
+  }
+  uint8_t* p = check.Buffer(depth, blockSize);
+  if (p == nullptr) {
+    check.Fault(block, "not enough memory to walk the tree this deep");
+    return;
+  }
+  if (_lseek(fd, block * kUnit, 0) != block * kUnit || _read(fd, p, uint32_t(blockSize)) != blockSize) {
+    check.Fault(block, "can't be read");
+    return;
+  }
+  ++nodes;
+  if (block + blockUnits > end) end = block + blockUnits;
+  const int32_t header = isMdx ? kMdxNodeHeader : kNdxNodeHeader;
+  const int32_t keyAt = isMdx ? kMdxEntryKey : kNdxEntryKey;
+  const int32_t n = int32_t(GetLe32(p + kNodeKeyCount));
+  const int32_t room = (blockSize - header - 4) / entrySize;
+  if (n < 0 || n > room) {
+    check.Fault(block, "holds %d keys, more than the %d it has room for", n, room);
+    return;
+  }
+  const uint8_t* entries = p + header;
+  check.Keys(block, n, entries + keyAt, entrySize, lo, hi);
+  // As ReadNode tells them apart: an NDX leaf names no child in its first
+  // slot; an MDX leaf has a zero word behind its last entry, which in an
+  // interior node names the last child (the link, as a block number, when
+  // the word is the link as a byte offset).
+  int32_t last = 0;
+  bool leaf;
+  if (!isMdx) {
+    leaf = GetLe32(entries + kEntryChild) == 0;
+  } else {
+    const int32_t link = int32_t(GetLe32(p + kMdxNodeLink));
+    last = int32_t(GetLe32(entries + n * entrySize));
+    leaf = last == 0;
+    if (link != 0 && int64_t(last) == int64_t(link) * kUnit) last = link;
+  }
+  if (leaf) {
+    if (check.Leaf(block, depth) && n == 0 && depth > 0)
+      check.Fault(block, "an empty leaf below the root: the walk in key order stops there");
+    return;
+  }
+  for (int i = 0; i <= n; ++i) {
+    const int32_t child = i < n || !isMdx ? int32_t(GetLe32(entries + i * entrySize + kEntryChild)) : last;
+    ZQTreeCheck::Bound below = i > 0 ? ZQTreeCheck::Bound{entries + (i - 1) * entrySize + keyAt, block} : lo;
+    ZQTreeCheck::Bound above = i < n ? ZQTreeCheck::Bound{entries + i * entrySize + keyAt, block} : hi;
+    if (CheckLink(check, block, i, n, child)) CheckNode(check, child, depth + 1, block, below, above, end, nodes);
+  }
 }

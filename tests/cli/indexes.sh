@@ -149,6 +149,8 @@ CASES
 cp d.dbt x.dbt && cp d.mdx x.mdx && cp d.dbf x.dbf
 printf '\x01\0\0\0' | dd of=x.dbt bs=1 seek=0 conv=notrunc 2>/dev/null
 expect_run 1 check x.dbf --format json && expect_out '"part": "memo", "record": 3' && expect_out "next free block 1 lies below"
+cp d.dbt x.dbt && printf '\x04\0\0\0' | dd of=x.mdx bs=1 seek=32 conv=notrunc 2>/dev/null
+expect_run 1 check x.dbf && expect_out "index NAME: block 0: the file header's next free block 4 lies inside this tag's tree"
 # A record appended by a program that keeps no index (its bytes added by hand).
 python3 -c "
 import struct

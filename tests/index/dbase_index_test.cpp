@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cstring>
+#include <functional>
 #include <random>
 #include <string>
 #include <vector>
@@ -335,6 +336,8 @@ TEST(IndexCursor, MovesOneKeyAtATimeBothWaysWhereTheKindCan) {
 // Trees of every shape: every record once, in key order, after reopening.
 
 void CheckWalk(ZQDBMdx& ix, int n, int dups, int width, bool backwards) {
+  ZQString faults;
+  ASSERT_EQ(ix.CheckTree(faults), 0) << faults.c_str();
   std::vector<char> seen(static_cast<size_t>(n), 0);
   ZQString key, prev;
   int count = 0;
@@ -441,6 +444,124 @@ TEST(DbaseDamage, AMissingFileOrTagIsNotOk) {
   EXPECT_FALSE(ZQDBMdx(base.c_str(), "OTHER").OK());
   EXPECT_TRUE(ZQDBMdx(base.c_str(), "name").OK());  // names are found in any case
   EXPECT_FALSE(ZQDBMdx("unused", ScratchPath("none.ndx").c_str()).OK());
+}
+
+// ---------------------------------------------------------------------------
+// The tree's structure, checked block by block
+
+// A dBASE tree read from the file's bytes as its layout says. Both kinds keep
+// an interior block's last child where entry n would begin: an MDX node in
+// the word behind its last entry, an NDX node in its last child's slot.
+struct DbaseTree {
+  Bytes b;
+  bool mdx;
+  uint32_t entry, header, keyAt, blockBytes, root = 0;
+  DbaseTree(Bytes bytes, bool isMdx, uint32_t keyLength)
+      : b(std::move(bytes)), mdx(isMdx), entry(isMdx ? (keyLength + 7) & ~3u : (keyLength + 11) & ~3u),
+        header(isMdx ? 8 : 4), keyAt(isMdx ? 4 : 8), blockBytes(isMdx ? 1024 : 512) {
+    root = mdx ? Le32At(b, Le32At(b, 544) * 512) : Le32At(b, 0);
+  }
+  uint32_t Count(uint32_t blk) const { return Le32At(b, blk * 512); }
+  size_t Entry(uint32_t blk, uint32_t i) const { return blk * 512 + header + i * entry; }
+  uint32_t Child(uint32_t blk, uint32_t i) const { return Le32At(b, Entry(blk, i)); }
+  uint32_t LastChild(uint32_t blk) const { return Child(blk, Count(blk)); }
+  bool Leaf(uint32_t blk) const { return Child(blk, mdx ? Count(blk) : 0) == 0; }
+  void SetChild(uint32_t blk, uint32_t i, uint32_t v) { PutLe32(&b[Entry(blk, i)], v); }
+  uint8_t* Key(uint32_t blk, uint32_t i) { return &b[Entry(blk, i) + keyAt]; }
+  uint32_t Room() const { return (blockBytes - header - 4) / entry; }
+};
+
+TEST(DbaseTreeCheck, FindsEachFaultOfStructureOnceAndNamesItsBlock) {
+  const int width = 60, n = 1500;  // 15 keys in an MDX node, 7 in an NDX node
+  for (const char* name : {"NAME", "CHECK.NDX"}) {
+    SCOPED_TRACE(name);
+    const bool mdx = std::string(name) == "NAME";
+    OneField f(width);
+    std::string base = Base("check");
+    std::string tag = mdx ? name : ScratchPath(name);
+    std::vector<int> order(n);
+    for (int i = 0; i < n; ++i) order[size_t(i)] = i;
+    std::shuffle(order.begin(), order.end(), std::mt19937(5));
+    {
+      ZQDBMdx ix(base.c_str(), tag.c_str(), f.record, &f.def);
+      for (int r : order) ASSERT_TRUE(Add(ix, Key(r, width), r));
+    }
+    const std::string file = mdx ? base + ".mdx" : tag;
+    const DbaseTree good(ReadFile(file), mdx, width);
+    // The places of the tree: the root's first two children and its last,
+    // the first two leaves, their parent and depth, the first leaf below the
+    // root's last child. The index opens along its first children, so the
+    // damage that would stop that lies beside them.
+    const uint32_t R = good.root, X0 = good.Child(R, 0), X1 = good.Child(R, 1);
+    uint32_t P = R, depth = 1;
+    while (!good.Leaf(good.Child(P, 0))) P = good.Child(P, 0), ++depth;
+    const uint32_t L0 = good.Child(P, 0), L1 = good.Child(P, 1);
+    uint32_t lastFirst = good.LastChild(R);
+    while (!good.Leaf(lastFirst)) lastFirst = good.Child(lastFirst, 0);
+    ASSERT_GE(depth, 2u);
+    using Fault = std::pair<uint32_t, std::string>;  // the block told, and what is said of it
+    auto num = [](uint32_t v) { return std::to_string(v); };
+    struct Case {
+      const char* what;
+      bool mdxOnly;
+      std::function<Fault(DbaseTree&)> damage;
+    } cases[] = {
+        {"a child that is its own parent", false,
+         [&](DbaseTree& t) { t.SetChild(X1, 0, R); return Fault{R, "reached a second time (from the header and block " + num(X1) + ")"}; }},
+        {"two children naming one block", false,
+         [&](DbaseTree& t) {
+           t.SetChild(X1, 0, t.Child(X0, 1));
+           return Fault{t.Child(X0, 1), "reached a second time (from block " + num(X0) + " and block " + num(X1) + ")"};
+         }},
+        {"a key count the block can't hold", false,
+         [&](DbaseTree& t) { PutLe32(&t.b[L1 * 512], 5000); return Fault{L1, "holds 5000 keys, more than the " + num(t.Room())}; }},
+        {"an empty leaf below the root", false,
+         [&](DbaseTree& t) { PutLe32(&t.b[L1 * 512], 0); t.SetChild(L1, 0, 0); return Fault{L1, "an empty leaf below the root"}; }},
+        {"a level skipped", false,
+         [&](DbaseTree& t) {
+           t.SetChild(R, t.Count(R), lastFirst);
+           return Fault{lastFirst, "a leaf 1 level below the root, where the first leaf lies " + num(depth) + " levels"};
+         }},
+        {"a child past the end", false,
+         [&](DbaseTree& t) { t.SetChild(R, 1, 0x7FFFFF); return Fault{R, "names block 8388607, which lies past the end"}; }},
+        {"a child in the header", false,
+         [&](DbaseTree& t) { t.SetChild(R, 1, 0); return Fault{R, "names block 0, which lies in the file's header"}; }},
+        {"a block off its boundary", true,
+         [&](DbaseTree& t) { t.SetChild(R, 1, X1 + 1); return Fault{R, "entry 1 names block " + num(X1 + 1) + ", which is not on a block boundary"}; }},
+        {"keys out of order in a leaf", false,
+         [&](DbaseTree& t) {
+           std::swap_ranges(t.Key(L0, 0), t.Key(L0, 0) + width, t.Key(L0, 1));
+           return Fault{L0, "the keys are out of order"};
+         }},
+        {"a separator below its child's keys", false,  // the parent's key for the first leaf: its lowest key
+         [&](DbaseTree& t) {
+           memcpy(t.Key(P, 0), t.Key(L0, 0), width);
+           return Fault{L0, "the highest key that block " + num(P) + " holds for this block"};
+         }},
+        {"the next free block inside the tree", true,
+         [&](DbaseTree& t) { PutLe32(&t.b[32], 4); return Fault{0, "the file header's next free block 4 lies inside this tag's tree"}; }},
+        {"a block count below the tree's", true,
+         [&](DbaseTree& t) { PutLe32(&t.b[4 * 512 + 4], 2); return Fault{4, "the tag header counts 2 units of blocks, fewer than"}; }},
+    };
+    for (Case& c : cases) {
+      if (c.mdxOnly && !mdx) continue;
+      SCOPED_TRACE(c.what);
+      DbaseTree bad = good;
+      Fault want = c.damage(bad);
+      tests::WriteScratch(mdx ? "check.mdx" : "CHECK.NDX", bad.b);
+      ZQDBMdx ix(base.c_str(), tag.c_str());
+      ASSERT_TRUE(ix.OK());
+      ZQString faults;
+      EXPECT_EQ(ix.CheckTree(faults), 1) << faults.c_str();
+      std::string line(faults.c_str());
+      EXPECT_EQ(line.rfind("block " + num(want.first) + ": ", 0), 0u) << line;
+      EXPECT_NE(line.find(want.second), std::string::npos) << line;
+    }
+    tests::WriteScratch(mdx ? "check.mdx" : "CHECK.NDX", good.b);
+    ZQDBMdx ix(base.c_str(), tag.c_str());
+    ZQString faults;
+    EXPECT_EQ(ix.CheckTree(faults), 0) << faults.c_str();
+  }
 }
 
 }  // namespace

@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <cstring>
+#include <functional>
 #include <random>
 #include <string>
 #include <vector>
@@ -407,6 +408,8 @@ TEST(FoxTrees, HoldEveryKeyInAnyOrderOfArrival) {
     taglist = nullptr;
     ZQDBFoxIndex ix(base.c_str(), name.c_str(), taglist);
     ASSERT_TRUE(ix.OK()) << ix.Reason();
+    ZQString faults;
+    ASSERT_EQ(ix.CheckTree(faults), 0) << faults.c_str();
     CheckWalk(ix, keyOf);
     delete taglist;
   }
@@ -575,6 +578,129 @@ TEST(FoxDamage, AMissingFileOrTagIsNotOk) {
   tests::WriteScratch("missing.cdx", Bytes(100, 0x41));
   EXPECT_FALSE(ZQDBFoxIndex(base.c_str(), "NAME", taglist).OK());
   EXPECT_EQ(taglist, nullptr);
+}
+
+// ---------------------------------------------------------------------------
+// The tree's structure, checked block by block
+
+// A Fox tree read from the file's bytes as its layout says; blocks are named
+// by their byte offsets, as the file names them.
+struct FoxTree {
+  Bytes b;
+  uint32_t entry;  // of an interior block
+  FoxTree(Bytes bytes, bool compact, uint32_t keyLength) : b(std::move(bytes)), entry(keyLength + (compact ? 8 : 4)) {}
+  uint32_t Count(uint32_t at) const { return GetLe16(&b[at + 2]); }
+  bool Leaf(uint32_t at) const { return (b[at] & 2) != 0; }
+  uint32_t Child(uint32_t at, uint32_t i) const { return GetBe32(&b[at + 12 + i * entry + entry - 4]); }
+  void SetChild(uint32_t at, uint32_t i, uint32_t v) { PutBe32(&b[at + 12 + i * entry + entry - 4], v); }
+  uint32_t Right(uint32_t at) const { return GetLe32(&b[at + 8]); }
+};
+
+TEST(FoxTreeCheck, FindsEachFaultOfStructureOnceAndNamesItsBlock) {
+  const int width = 30, n = 3000;
+  for (const Form& form : {Form{"TREE", true}, Form{"check.idx", false}}) {
+    SCOPED_TRACE(form.name);
+    const bool tag = form.compress;
+    KeyField f(width, form.compress);
+    std::string base = Table("check");
+    std::string name = tag ? form.name : ScratchPath(form.name);
+    std::vector<int> order(n);
+    for (int i = 0; i < n; ++i) order[size_t(i)] = i;
+    std::shuffle(order.begin(), order.end(), std::mt19937(5));
+    ZQDBFoxIndex* taglist = nullptr;
+    {
+      ZQDBFoxIndex ix(base.c_str(), name.c_str(), f.fields, f.def, taglist);
+      for (int r : order) ASSERT_TRUE(Put(ix, Key(r, width), r));
+    }
+    delete taglist;
+    taglist = nullptr;
+    const std::string file = tag ? base + ".cdx" : name;
+    const FoxTree good(ReadFile(file), form.compress, width);
+    const uint32_t R = GetLe32(&good.b[tag ? 1536 : 0]);  // the root, from the index header
+    // The places of the tree, as in the dBASE check above.
+    const uint32_t X0 = good.Child(R, 0), X1 = good.Child(R, 1), last = good.Count(R) - 1;
+    uint32_t P = R, depth = 1;
+    while (!good.Leaf(good.Child(P, 0))) P = good.Child(P, 0), ++depth;
+    const uint32_t L0 = good.Child(P, 0), L1 = good.Child(P, 1), L2 = good.Child(P, 2);
+    uint32_t lastFirst = good.Child(R, last), lastLeaf = R;
+    while (!good.Leaf(lastFirst)) lastFirst = good.Child(lastFirst, 0);
+    while (!good.Leaf(lastLeaf)) lastLeaf = good.Child(lastLeaf, good.Count(lastLeaf) - 1);
+    ASSERT_GE(depth, 2u);
+    using Fault = std::pair<uint32_t, std::string>;  // the block told (a byte offset), and what is said of it
+    auto blk = [](uint32_t at) { return "block " + std::to_string(at / 512); };
+    struct Case {
+      const char* what;
+      int forms;  // 1 compact, 2 non-compact, 3 both
+      std::function<Fault(FoxTree&)> damage;
+    } cases[] = {
+        {"a child that is its own parent", 3,
+         [&](FoxTree& t) { t.SetChild(X1, 0, R); return Fault{R, "reached a second time (from the header and " + blk(X1) + ")"}; }},
+        {"two children naming one block", 3,
+         [&](FoxTree& t) {
+           t.SetChild(X1, 0, t.Child(X0, 1));
+           return Fault{t.Child(X0, 1), "reached a second time (from " + blk(X0) + " and " + blk(X1) + ")"};
+         }},
+        {"a key count the block can't hold", 3,
+         [&](FoxTree& t) { PutLe16(&t.b[L1 + 2], 5000); return Fault{L1, "holds 5000 keys, more than the"}; }},
+        {"an interior block with no keys", 3,
+         [&](FoxTree& t) { PutLe16(&t.b[X1 + 2], 0); return Fault{X1, "an interior block with no keys"}; }},
+        {"a level skipped", 3,
+         [&](FoxTree& t) {
+           t.SetChild(R, last, lastFirst);
+           return Fault{lastFirst, "a leaf 1 level below the root, where the first leaf lies " + std::to_string(depth) + " levels"};
+         }},
+        {"a right sibling link wrong", 3,
+         [&](FoxTree& t) { PutLe32(&t.b[L0 + 8], L2); return Fault{L0, "its right sibling is " + blk(L2) + ", where the block after it at its level is " + blk(L1)}; }},
+        {"a first block with a left sibling", 3,
+         [&](FoxTree& t) { PutLe32(&t.b[L0 + 4], L1); return Fault{L0, "its left sibling is " + blk(L1) + ", where it is the first block of its level"}; }},
+        {"a last block with a right sibling", 3,
+         [&](FoxTree& t) { PutLe32(&t.b[lastLeaf + 8], L0); return Fault{lastLeaf, "its right sibling is " + blk(L0) + ", where it is the last block of its level"}; }},
+        {"a child past the end", 3,
+         [&](FoxTree& t) { t.SetChild(R, 1, 0x7FFFFE00); return Fault{R, "entry 1 names block 4194303, which lies past the end"}; }},
+        {"a child off a block boundary", 3,
+         [&](FoxTree& t) { t.SetChild(R, 1, X1 + 3); return Fault{R, "entry 1 names offset " + std::to_string(X1 + 3) + ", which is not on a 512-byte block boundary"}; }},
+        {"a child in the header", 3,
+         [&](FoxTree& t) { t.SetChild(R, 1, 0); return Fault{R, "entry 1 names block 0, which lies in an index header"}; }},
+        {"a separator below its child's keys", 3,  // the parent's key for the first leaf: its lowest key
+         [&](FoxTree& t) {
+           std::string low = Key(0, width);
+           memcpy(&t.b[P + 12], low.data(), size_t(width));
+           return Fault{L0, "the highest key that " + blk(P) + " holds for this block"};
+         }},
+        {"keys out of order in a leaf", 2,
+         [&](FoxTree& t) { std::swap_ranges(&t.b[L1 + 12], &t.b[L1 + 12 + width], &t.b[L1 + 12 + width + 4]); return Fault{L1, "the keys are out of order"}; }},
+        {"a compact leaf that can't be decoded", 1,
+         [&](FoxTree& t) { t.b[L1 + 23] = 0; return Fault{L1, "its keys can't be rebuilt"}; }},
+        // Tolerated, as Perl XBase writes them: no fault.
+        {"a root's links of 0", 3, [&](FoxTree& t) { PutLe32(&t.b[R + 4], 0); PutLe32(&t.b[R + 8], 0); return Fault{0, ""}; }},
+        {"an interior key filled with NUL bytes", 3,
+         [&](FoxTree& t) { memset(&t.b[P + 12 + 8], 0, size_t(width - 8)); return Fault{0, ""}; }},
+    };
+    for (Case& c : cases) {
+      if ((c.forms & (form.compress ? 1 : 2)) == 0) continue;
+      SCOPED_TRACE(c.what);
+      FoxTree bad = good;
+      Fault want = c.damage(bad);
+      tests::WriteScratch(tag ? "check.cdx" : form.name, bad.b);
+      ZQString faults;
+      {
+        ZQDBFoxIndex ix(base.c_str(), name.c_str(), taglist);
+        EXPECT_TRUE(ix.OK()) << ix.Reason();
+        EXPECT_EQ(ix.CheckTree(faults), want.second.empty() ? 0 : 1) << faults.c_str();
+      }
+      delete taglist;  // its descriptor would keep the file's pages cached
+      taglist = nullptr;
+      if (want.second.empty()) continue;
+      std::string line(faults.c_str());
+      EXPECT_EQ(line.rfind(blk(want.first) + ": ", 0), 0u) << line;
+      EXPECT_NE(line.find(want.second), std::string::npos) << line;
+    }
+    tests::WriteScratch(tag ? "check.cdx" : form.name, good.b);
+    ZQDBFoxIndex ix(base.c_str(), name.c_str(), taglist);
+    ZQString faults;
+    EXPECT_EQ(ix.CheckTree(faults), 0) << faults.c_str();
+    delete taglist;
+  }
 }
 
 }  // namespace

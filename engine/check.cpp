@@ -583,7 +583,10 @@ int RunCheck(const std::string& table, const SourceOptions& source, const CheckR
   ZQString version;
   spoke->GetOption("version", version);
   const int dialect = atoi(version.c_str());
-  const int64_t header_count = atoll(SpokeFact(facts, "records").c_str());
+  // The file holds the count unsigned; the module holds it in 32 signed bits,
+  // so a damaged count past 2^31 comes back negative.
+  int64_t header_count = atoll(SpokeFact(facts, "records").c_str());
+  if (header_count < 0) header_count += int64_t(1) << 32;
   const int64_t hdrlen = atoll(SpokeFact(facts, "header").c_str());
   const int64_t reclen = atoll(SpokeFact(facts, "record").c_str());
   const std::vector<FieldDesc> fields = RawFieldsOf(facts);
@@ -602,6 +605,7 @@ int RunCheck(const std::string& table, const SourceOptions& source, const CheckR
   const int64_t expected = hdrlen + header_count * reclen;
   int64_t whole = reclen > 0 && size > hdrlen ? (size - hdrlen) / reclen : 0;
   if (whole > header_count) whole = header_count;
+  if (whole < 0) whole = 0;
   if (size < expected) {
     findings.Add("table", whole + 1, -1, size,
                  "the header counts " + std::to_string(header_count) + " records, the file holds " +

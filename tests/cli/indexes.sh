@@ -142,6 +142,7 @@ deleted|b[h + 2 * r] = ord('*')|index NAME: record 3: key 'cid' names a deleted 
 date|b[h + 11:h + 19] = b'20011399'|BORN '20011399' has no month 1-12
 number|b[h + 19:h + 24] = b'  1x2'|QTY '  1x2' is no number
 short|del b[-r // 2:]|the header counts 3 records, the file holds 2 whole ones
+huge|b[7] = 0xF5|the header counts 4110417923 records, the file holds 3 whole ones
 extra|b[4] -= 1|bytes stand behind the last of the header's 2 records
 memo|b[h + 34:h + 34] = b''; b[h + 24:h + 34] = b'       999'|block 999 lies past the end of the memo file
 shared|b[h + r + 24:h + r + 34] = b[h + 24:h + 34]|shares block 1 with the memo of record 1

@@ -77,7 +77,7 @@ class IndexObjectWalk : public ZQIndexWalk {
   bool Broken() const override { return index_->Broken(); }
   void BuildKey(ZQString& key) override { index_->BuildKey(key, &def_); }
   bool Unique() const override { return unique_; }
-  int32_t CheckTree(ZQString& findings) override { return index_->CheckTree(findings); }
+  int32_t CheckTree(ZQString& findings, bool byValue) override { return index_->CheckTree(findings, byValue); }
 
  private:
   ZQDBIndexBase* index_;

@@ -20,7 +20,8 @@ void Exercise(ZQDBMdx& ix, bool backwards) {
   if (!ix.OK()) return;
   ZQString key;
   ZQString faults;
-  ix.CheckTree(faults);
+  ix.CheckTree(faults, false);
+  ix.CheckTree(faults, true);
   int n = 0;
   for (int32_t r = ix.FirstKey(key); r != -1 && n < 200000; r = ix.NextKey(key)) ++n;
   if (backwards)

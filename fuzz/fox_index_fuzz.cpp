@@ -18,7 +18,8 @@ constexpr int kMaxTags = 8;
 void Exercise(ZQDBFoxIndex& ix) {
   if (!ix.OK()) return;
   ZQString faults;
-  ix.CheckTree(faults);
+  ix.CheckTree(faults, false);
+  ix.CheckTree(faults, true);
   ZQString key, first;
   int steps = 0;
   for (int32_t r = ix.FirstKey(key); r != -1 && steps < kMaxSteps; r = ix.NextKey(key), ++steps)

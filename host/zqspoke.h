@@ -200,9 +200,11 @@ class ZQIndexWalk {
   // For check: walks every block of the tree from the root, bounded by the
   // file's size, and appends a line "block N: what is wrong" for each fault
   // of structure (levels, sibling links, counts, keys out of order within a
-  // block, a block reached twice). The number of faults.
-  virtual int32_t CheckTree(ZQString& findings) {
+  // block, a block reached twice). `byValue`: 8-byte keys compared as the
+  // doubles they hold. The number of faults.
+  virtual int32_t CheckTree(ZQString& findings, bool byValue) {
     (void)findings;
+    (void)byValue;
     return 0;
   }
 };

@@ -53,10 +53,13 @@ class ZQ_EXPORT ZQDBIndexBase {
   // index that was given keys may hold changed blocks that aren't written
   // yet), and appends a line "block N: what is wrong" to `findings` for each
   // fault of structure; N counts 512-byte units in every kind. Reads only,
-  // bounded by the file's size. The number of faults; 0 for an index that
-  // isn't open.
-  virtual int32_t CheckTree(ZQString& findings) {
+  // bounded by the file's size. `byValue` compares 8-byte keys as the
+  // doubles they hold, in the order of their values (as dBASE and libxbase64
+  // order numeric and date keys), rather than by their bytes. The number of
+  // faults; 0 for an index that isn't open.
+  virtual int32_t CheckTree(ZQString& findings, bool byValue) {
     (void)findings;
+    (void)byValue;
     return 0;
   }
 

@@ -1107,9 +1107,9 @@ bool ZQDBFoxNode::WriteChain() {
 // ---------------------------------------------------------------------------
 // Checking the tree's structure
 
-int32_t ZQDBFoxIndex::CheckTree(ZQString& findings) {
+int32_t ZQDBFoxIndex::CheckTree(ZQString& findings, bool byValue) {
   if (!ok || fd < 0 || root == nullptr) return 0;
-  ZQTreeCheck check(findings, _lseek(fd, 0, 2), keyLength);
+  ZQTreeCheck check(findings, _lseek(fd, 0, 2), keyLength, byValue);
   if (!check.Ready()) return check.Finish();
   // A node object of this index, cut loose from the chain, reads each block
   // as the walk in key order does; it is never dirty, so it writes nothing.

@@ -87,7 +87,7 @@ class ZQ_EXPORT ZQDBFoxIndex : public ZQDBIndexBase {
   // one), in order and within the keys its parent holds for it; the leaves
   // lie at one depth, and the sibling links of each level follow its blocks
   // in key order, with none outside the first and the last.
-  int32_t CheckTree(ZQString& findings) override;
+  int32_t CheckTree(ZQString& findings, bool byValue) override;
 
  private:
   ZQDBFoxIndex();

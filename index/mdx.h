@@ -72,7 +72,7 @@ class ZQ_EXPORT ZQDBMdx : public ZQDBIndexBase {
   // it; the leaves lie at one depth, and only the root may be an empty leaf.
   // For an MDX tag, the file header's next free block and the tag's block
   // count lie beyond the blocks the tree uses.
-  int32_t CheckTree(ZQString& findings) override;
+  int32_t CheckTree(ZQString& findings, bool byValue) override;
 
  private:
   friend class ZQDBMdxNode;

@@ -436,9 +436,9 @@ const char* LinkName(int entry, int keys, char (&out)[40]) {
 
 }  // namespace
 
-int32_t ZQDBMdx::CheckTree(ZQString& findings) {
+int32_t ZQDBMdx::CheckTree(ZQString& findings, bool byValue) {
   if (!ok || fd == -1 || root == nullptr) return 0;
-  ZQTreeCheck check(findings, _lseek(fd, 0, 2), keyLength);
+  ZQTreeCheck check(findings, _lseek(fd, 0, 2), keyLength, byValue);
   if (!check.Ready()) return check.Finish();
   const int32_t header = isMdx ? headerBlock : 0;
   const int32_t rootBlock = rootOffset / kUnit;

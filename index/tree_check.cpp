@@ -6,8 +6,10 @@
 #include <cstring>
 #include <new>
 
-ZQTreeCheck::ZQTreeCheck(ZQString& out, int32_t fileSize, int32_t keyLength)
-    : out_(out), units_(fileSize > 0 ? fileSize / kUnit : 0), keyLength_(keyLength) {
+#include "host/endian.h"
+
+ZQTreeCheck::ZQTreeCheck(ZQString& out, int32_t fileSize, int32_t keyLength, bool byValue)
+    : out_(out), units_(fileSize > 0 ? fileSize / kUnit : 0), keyLength_(keyLength), byValue_(byValue && keyLength == 8) {
   from_ = new (std::nothrow) int32_t[size_t(units_) + 1];
   if (from_ == nullptr) {
     Fault(-1, "not enough memory to walk the tree");
@@ -61,7 +63,7 @@ bool ZQTreeCheck::Leaf(int32_t block, int depth) {
 const uint8_t* ZQTreeCheck::Blanked(const uint8_t* key, ZQString& out) {
   int32_t n = keyLength_;
   while (n > 0 && key[n - 1] == 0) --n;
-  if (n == keyLength_ || (out.Capacity() < keyLength_ && !out.Allocate(keyLength_))) return key;
+  if (n == keyLength_ || byValue_ || (out.Capacity() < keyLength_ && !out.Allocate(keyLength_))) return key;
   uint8_t* p = reinterpret_cast<uint8_t*>(out.GetBuffer());
   memcpy(p, key, size_t(n));
   memset(p + n, ' ', size_t(keyLength_ - n));
@@ -69,28 +71,37 @@ const uint8_t* ZQTreeCheck::Blanked(const uint8_t* key, ZQString& out) {
 }
 
 void ZQTreeCheck::Keys(int32_t block, int count, const uint8_t* first, int32_t stride, Bound lo, Bound hi) {
-  const size_t n = size_t(keyLength_);
   const uint8_t* loBlanked = lo.key != nullptr ? Blanked(lo.key, loBlanked_) : nullptr;
   const uint8_t* hiBlanked = hi.key != nullptr ? Blanked(hi.key, hiBlanked_) : nullptr;
   bool order = true, low = true, high = true;
   for (int i = 0; i < count; ++i) {
     const uint8_t* key = first + int64_t(i) * stride;
-    if (order && i > 0 && memcmp(key - stride, key, n) > 0) {
+    if (order && i > 0 && Compare(key - stride, key) > 0) {
       order = false;
       Fault(block, "key %d %s is less than key %d %s before it: the keys are out of order", i, Shown(key, 0), i - 1,
             Shown(key - stride, 1));
     }
-    if (low && lo.key != nullptr && memcmp(key, lo.key, n) < 0 && memcmp(key, loBlanked, n) < 0) {
+    if (low && lo.key != nullptr && Compare(key, lo.key) < 0 && Compare(key, loBlanked) < 0) {
       low = false;
       Fault(block, "key %d %s is less than %s, the key that block %d holds before this block", i, Shown(key, 0),
             Shown(lo.key, 1), lo.block);
     }
-    if (high && hi.key != nullptr && memcmp(key, hi.key, n) > 0 && memcmp(key, hiBlanked, n) > 0) {
+    if (high && hi.key != nullptr && Compare(key, hi.key) > 0 && Compare(key, hiBlanked) > 0) {
       high = false;
       Fault(block, "key %d %s is greater than %s, the highest key that block %d holds for this block", i,
             Shown(key, 0), Shown(hi.key, 1), hi.block);
     }
   }
+}
+
+int ZQTreeCheck::Compare(const uint8_t* a, const uint8_t* b) const {
+  if (!byValue_) return memcmp(a, b, size_t(keyLength_));
+  double x, y;
+  uint64_t bits = GetLe64(a);
+  memcpy(&x, &bits, sizeof x);
+  bits = GetLe64(b);
+  memcpy(&y, &bits, sizeof y);
+  return x < y ? -1 : x > y ? 1 : 0;  // NaN is out of order with nothing
 }
 
 uint8_t* ZQTreeCheck::Buffer(int depth, int32_t bytes) {

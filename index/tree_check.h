@@ -27,8 +27,9 @@ class ZQTreeCheck {
     int32_t block = -1;
   };
 
-  // `out` takes the lines; `fileSize` bytes in the index file.
-  ZQTreeCheck(ZQString& out, int32_t fileSize, int32_t keyLength);
+  // `out` takes the lines; `fileSize` bytes in the index file. `byValue`:
+  // keys of 8 bytes are compared as the little-endian doubles they hold.
+  ZQTreeCheck(ZQString& out, int32_t fileSize, int32_t keyLength, bool byValue);
   ~ZQTreeCheck();
   ZQTreeCheck(const ZQTreeCheck&) = delete;
   ZQTreeCheck& operator=(const ZQTreeCheck&) = delete;
@@ -69,6 +70,8 @@ class ZQTreeCheck {
   // A key for people, in one of two slots: printable bytes as they are,
   // others as \xHH, trailing blanks cut, quoted.
   const char* Shown(const uint8_t* key, int slot);
+  // Two keys in the order of this check: <0, 0, >0.
+  int Compare(const uint8_t* a, const uint8_t* b) const;
   // `key` with its trailing NUL bytes read as blanks, in `out` where that
   // changes it.
   const uint8_t* Blanked(const uint8_t* key, ZQString& out);
@@ -86,6 +89,7 @@ class ZQTreeCheck {
   ZQString& out_;
   int32_t units_;
   int32_t keyLength_;
+  bool byValue_;
   int32_t faults_ = 0;
   int leafDepth_ = -1;
   // The block each unit was first reached from: -2 not reached, -1 the header.

@@ -337,7 +337,7 @@ TEST(IndexCursor, MovesOneKeyAtATimeBothWaysWhereTheKindCan) {
 
 void CheckWalk(ZQDBMdx& ix, int n, int dups, int width, bool backwards) {
   ZQString faults;
-  ASSERT_EQ(ix.CheckTree(faults), 0) << faults.c_str();
+  ASSERT_EQ(ix.CheckTree(faults, false), 0) << faults.c_str();
   std::vector<char> seen(static_cast<size_t>(n), 0);
   ZQString key, prev;
   int count = 0;
@@ -552,7 +552,7 @@ TEST(DbaseTreeCheck, FindsEachFaultOfStructureOnceAndNamesItsBlock) {
       ZQDBMdx ix(base.c_str(), tag.c_str());
       ASSERT_TRUE(ix.OK());
       ZQString faults;
-      EXPECT_EQ(ix.CheckTree(faults), 1) << faults.c_str();
+      EXPECT_EQ(ix.CheckTree(faults, false), 1) << faults.c_str();
       std::string line(faults.c_str());
       EXPECT_EQ(line.rfind("block " + num(want.first) + ": ", 0), 0u) << line;
       EXPECT_NE(line.find(want.second), std::string::npos) << line;
@@ -560,7 +560,35 @@ TEST(DbaseTreeCheck, FindsEachFaultOfStructureOnceAndNamesItsBlock) {
     tests::WriteScratch(mdx ? "check.mdx" : "CHECK.NDX", good.b);
     ZQDBMdx ix(base.c_str(), tag.c_str());
     ZQString faults;
-    EXPECT_EQ(ix.CheckTree(faults), 0) << faults.c_str();
+    EXPECT_EQ(ix.CheckTree(faults, false), 0) << faults.c_str();
+  }
+}
+
+// Numeric keys are doubles: the module keeps them in the order of their
+// bytes, dBASE and libxbase64 in the order of their values; a check by
+// value judges the second order as a check by bytes judges the first.
+TEST(DbaseTreeCheck, JudgesDoubleKeysByTheirBytesOrByTheirValues) {
+  OneField f(8);
+  std::string path = ScratchPath("values.ndx");
+  {
+    ZQDBMdx ix("unused", path.c_str(), f.record, &f.def);
+    for (double v : {1.0, 2.0, 3.0}) {
+      uint8_t key[8];
+      uint64_t bits;
+      memcpy(&bits, &v, sizeof bits);
+      PutLe64(key, bits);
+      ASSERT_TRUE(Add(ix, std::string(reinterpret_cast<char*>(key), 8), int32_t(v)));
+    }
+  }
+  Bytes bytes = ReadFile(path);  // one leaf at block 1: 2.0, 3.0, 1.0, entries of 16 bytes from offset 516
+  Bytes values = bytes;
+  std::rotate(values.begin() + 516, values.begin() + 516 + 32, values.begin() + 516 + 48);  // 1.0, 2.0, 3.0
+  for (const Bytes* file : {&bytes, &values}) {
+    tests::WriteScratch("values.ndx", *file);
+    ZQDBMdx ix("unused", path.c_str());
+    ZQString byBytes, byValue;
+    EXPECT_EQ(ix.CheckTree(byBytes, false), file == &bytes ? 0 : 1) << byBytes.c_str();
+    EXPECT_EQ(ix.CheckTree(byValue, true), file == &bytes ? 1 : 0) << byValue.c_str();
   }
 }
 

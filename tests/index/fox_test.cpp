@@ -409,7 +409,7 @@ TEST(FoxTrees, HoldEveryKeyInAnyOrderOfArrival) {
     ZQDBFoxIndex ix(base.c_str(), name.c_str(), taglist);
     ASSERT_TRUE(ix.OK()) << ix.Reason();
     ZQString faults;
-    ASSERT_EQ(ix.CheckTree(faults), 0) << faults.c_str();
+    ASSERT_EQ(ix.CheckTree(faults, false), 0) << faults.c_str();
     CheckWalk(ix, keyOf);
     delete taglist;
   }
@@ -686,7 +686,7 @@ TEST(FoxTreeCheck, FindsEachFaultOfStructureOnceAndNamesItsBlock) {
       {
         ZQDBFoxIndex ix(base.c_str(), name.c_str(), taglist);
         EXPECT_TRUE(ix.OK()) << ix.Reason();
-        EXPECT_EQ(ix.CheckTree(faults), want.second.empty() ? 0 : 1) << faults.c_str();
+        EXPECT_EQ(ix.CheckTree(faults, false), want.second.empty() ? 0 : 1) << faults.c_str();
       }
       delete taglist;  // its descriptor would keep the file's pages cached
       taglist = nullptr;
@@ -698,7 +698,7 @@ TEST(FoxTreeCheck, FindsEachFaultOfStructureOnceAndNamesItsBlock) {
     tests::WriteScratch(tag ? "check.cdx" : form.name, good.b);
     ZQDBFoxIndex ix(base.c_str(), name.c_str(), taglist);
     ZQString faults;
-    EXPECT_EQ(ix.CheckTree(faults), 0) << faults.c_str();
+    EXPECT_EQ(ix.CheckTree(faults, false), 0) << faults.c_str();
     delete taglist;
   }
 }

@@ -29,21 +29,6 @@ int32_t ZQField::DisplayLength() const {
 
 void ZQField::operator=(const ZQString& text) { AssignText(text.c_str(), text.length()); }
 
-void ZQField::AssignText(const char* p, int32_t n) {
-  switch (type_.Family()) {
-    case FT_NUMERIC:
-    case FT_INTEGER:
-    case FT_FLOAT:
-    case FT_CURRENCY: AssignNumberText(p, n); return;
-    case FT_DATE: AssignDateText(p, n); return;
-    case FT_BOOLEAN: AssignBoolText(p, n); return;
-    default:
-      text_.CopyN(p, n, 0);
-      held_ = Held::kText;
-      return;
-  }
-}
-
 void ZQField::AssignNumberText(const char* p, int32_t n) {
   // Numbers keep their digits: leading blanks go, the rest is parsed on demand.
   int32_t lead = int32_t(bytescan::SkipLeft(p, size_t(n), ' '));

@@ -32,7 +32,21 @@ class ZQField {
 
   void operator=(const ZQString& text);
   // The same as assigning a ZQString of those bytes, without building one.
-  void AssignText(const char* p, int32_t n);
+  // Inline: the record loops of the modules call it for every field.
+  void AssignText(const char* p, int32_t n) {
+    switch (type_.Family()) {
+      case FT_NUMERIC:
+      case FT_INTEGER:
+      case FT_FLOAT:
+      case FT_CURRENCY: AssignNumberText(p, n); return;
+      case FT_DATE: AssignDateText(p, n); return;
+      case FT_BOOLEAN: AssignBoolText(p, n); return;
+      default:
+        text_.CopyN(p, n, 0);
+        held_ = Held::kText;
+        return;
+    }
+  }
   void operator=(int32_t value);
   void operator=(double value);
   void operator=(const ZQDateTime& value);

@@ -5,7 +5,7 @@
 
 #include <string>
 
-#include "connector/todbase_harness.h"
+#include "support/todbase_harness.h"
 #include "host/platform.h"
 #include "index/mdx.h"
 

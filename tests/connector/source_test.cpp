@@ -16,39 +16,18 @@ namespace {
 
 using tests::Bytes;
 using tests::DbfBuilder;
+using tests::Dbl;
+using tests::Le32;
+using tests::Le64;
+using tests::Rec;
 using tests::Source;
-
-// Pieces of raw records.
-Bytes Str(const std::string& s) { return Bytes(s.begin(), s.end()); }
-Bytes Le32(int32_t v) {
-  Bytes b(4);
-  PutLe32(b.data(), uint32_t(v));
-  return b;
-}
-Bytes Le64(int64_t v) {
-  Bytes b(8);
-  PutLe64(b.data(), uint64_t(v));
-  return b;
-}
-Bytes Dbl(double d) {
-  uint64_t raw;
-  memcpy(&raw, &d, 8);
-  return Le64(int64_t(raw));
-}
-Bytes Rec(std::initializer_list<Bytes> parts, uint8_t flag = ' ') {
-  Bytes r{flag};
-  for (const Bytes& p : parts) r.insert(r.end(), p.begin(), p.end());
-  return r;
-}
+using tests::Text;
+using Rows = std::vector<std::string>;
+const std::string kEnd = Source::End();
 
 TEST(SourceTest, LayoutAndPlainTypes) {
-  Bytes bytes = DbfBuilder(0x03)
-                    .Field("NAME", 'C', 8)
-                    .Field("PRICE", 'N', 6, 2)
-                    .Field("RATE", 'F', 8, 3)
-                    .Field("BORN", 'D', 8)
-                    .Field("OK", 'L', 1)
-                    .Field("DIGIT", 'N', 1)
+  Bytes bytes = DbfBuilder(0x03).Field("NAME", 'C', 8).Field("PRICE", 'N', 6, 2).Field("RATE", 'F', 8, 3)
+                    .Field("BORN", 'D', 8).Field("OK", 'L', 1).Field("DIGIT", 'N', 1)
                     .Record({"  hi", "  1.50", "   2.125", "20240229", "T", "7"})
                     .Record({"", "", "", "", "?", ""})
                     .Record({"x y", "-12.00", "       0", "        ", "f", "0"})
@@ -80,8 +59,7 @@ TEST(SourceTest, LayoutAndPlainTypes) {
   EXPECT_TRUE(s.Field(1)->DataType().IsSigned());
   EXPECT_FALSE(s.Field(5)->DataType().IsSigned());  // N of width 1 is unsigned
 
-  ASSERT_EQ(s->GetRecord(0), 0);
-  EXPECT_EQ(s.Text(0), "  hi");  // trailing blanks go, leading ones stay
+  EXPECT_EQ(s.At(0), "  hi");  // trailing blanks go, leading ones stay
   EXPECT_DOUBLE_EQ(s.Field(1)->DoubleVal(), 1.5);
   EXPECT_DOUBLE_EQ(s.Field(2)->DoubleVal(), 2.125);
   EXPECT_EQ(s.Text(3), "20240229");
@@ -90,21 +68,18 @@ TEST(SourceTest, LayoutAndPlainTypes) {
   EXPECT_TRUE(s.Field(4)->BoolVal());
   EXPECT_DOUBLE_EQ(s.Field(5)->DoubleVal(), 7);
 
-  ASSERT_EQ(s->GetRecord(1), 0);  // all blank
+  EXPECT_EQ(s.At(1), "");  // all blank
   for (int i = 0; i < 6; ++i) EXPECT_TRUE(s.Field(i)->IsBlank()) << i;
-  EXPECT_EQ(s.Text(0), "");
 
-  ASSERT_EQ(s->GetRecord(2), 0);
-  EXPECT_EQ(s.Text(0), "x y");
+  EXPECT_EQ(s.At(2), "x y");
   EXPECT_DOUBLE_EQ(s.Field(1)->DoubleVal(), -12);
   EXPECT_TRUE(s.Field(3)->IsBlank());
   ASSERT_EQ(s.Field(4)->held(), ZQField::Held::kBool);
   EXPECT_FALSE(s.Field(4)->BoolVal());
 
-  EXPECT_EQ(s->GetRecord(3), ZQ_END);
+  EXPECT_EQ(s.At(3), kEnd);
   for (int i = 0; i < 6; ++i) EXPECT_TRUE(s.Field(i)->IsBlank()) << i;  // the record stays blank
-  ASSERT_EQ(s->GetRecord(0), 0);  // and any record can be asked for again
-  EXPECT_EQ(s.Text(0), "  hi");
+  EXPECT_EQ(s.At(0), "  hi");  // and any record can be asked for again
 
   EXPECT_EQ(s->ConnectionClose(), 0);
   EXPECT_FALSE(s->ConnectionEstablished());
@@ -119,13 +94,11 @@ TEST(SourceTest, DeletedRecordsAreSkipped) {
   bytes[65 + 7 * 2] = 'D';
   Source s;
   ASSERT_EQ(s.Open(tests::WriteScratch("src_deleted.dbf", bytes)), 0);
-  ASSERT_EQ(s->GetRecord(0), 0);
-  EXPECT_EQ(s.Text(0), "p3");
+  EXPECT_EQ(s.At(0), "p3");
   EXPECT_EQ(s->EstimateRecordCount(), 8 - 3);
-  ASSERT_EQ(s->GetRecord(0), 0);  // the same record again
-  EXPECT_EQ(s.Text(0), "p3");
+  EXPECT_EQ(s.At(0), "p3");  // the same record again
   BATCHERR rc;
-  EXPECT_EQ(s.FirstColumn(&rc), (std::vector<std::string>{"p3", "p4", "p6", "p7"}));
+  EXPECT_EQ(s.FirstColumn(&rc), (Rows{"p3", "p4", "p6", "p7"}));
   EXPECT_EQ(rc, ZQ_END);
   EXPECT_EQ(s->EstimateRecordCount(), 8 - 4);
 }
@@ -135,92 +108,76 @@ TEST(SourceTest, LogicalNumbersInAnyOrder) {
   Source s;
   ASSERT_EQ(s.Open(tests::WriteScratch("src_order.dbf", tests::NumberedTable(10, {0, 3, 6}))), 0);
   ZQDbase& db = DbaseTestPeer::Of(s.spoke());
-  ASSERT_EQ(s->GetRecord(5), 0);
-  EXPECT_EQ(s.Text(0), "p8");
-  ASSERT_EQ(s->GetRecord(2), 0);  // through the map
-  EXPECT_EQ(s.Text(0), "p4");
-  ASSERT_EQ(s->GetRecord(3), 0);  // on from the last one
-  EXPECT_EQ(s.Text(0), "p5");
+  EXPECT_EQ(s.At(5), "p8");
+  EXPECT_EQ(s.At(2), "p4");  // through the map
+  EXPECT_EQ(s.At(3), "p5");  // on from the last one
   // Invariant: the physical number of the highest logical one seen.
   EXPECT_EQ(DbaseTestPeer::HighRecord(db) + DbaseTestPeer::DeletedSkipped(db), 8);
-  ASSERT_EQ(s->GetRecord(6), 0);
-  EXPECT_EQ(s.Text(0), "p9");
-  EXPECT_EQ(s->GetRecord(7), ZQ_END);
-  ASSERT_EQ(s->GetRecord(0), 0);
-  EXPECT_EQ(s.Text(0), "p1");
+  EXPECT_EQ(s.At(6), "p9");
+  EXPECT_EQ(s.At(7), kEnd);
+  EXPECT_EQ(s.At(0), "p1");
 
   // A fresh target starts afresh, and a first request for record 1 doesn't
   // take the deleted physical record 0 for logical 0.
   ASSERT_EQ(s.Open(tests::WriteScratch("src_order.dbf", tests::NumberedTable(10, {0, 3, 6}))), 0);
   EXPECT_EQ(DbaseTestPeer::HighRecord(db), -1);
   EXPECT_EQ(DbaseTestPeer::DeletedSkipped(db), 0);
-  ASSERT_EQ(s->GetRecord(1), 0);
-  EXPECT_EQ(s.Text(0), "p2");
-  ASSERT_EQ(s->GetRecord(0), 0);
-  EXPECT_EQ(s.Text(0), "p1");
+  EXPECT_EQ(s.At(1), "p2");
+  EXPECT_EQ(s.At(0), "p1");
 }
 
 TEST(SourceTest, LargeTableInRandomOrder) {
   const int count = 20000;
-  std::vector<int> deleted;
-  std::vector<int> live;
-  for (int p = 0; p < count; ++p) {
-    if (p % 7 == 3 || p % 13 == 0 || (p > 5000 && p < 5100)) deleted.push_back(p);
-    else live.push_back(p);
-  }
+  std::vector<int> deleted, live;
+  for (int p = 0; p < count; ++p)
+    (p % 7 == 3 || p % 13 == 0 || (p > 5000 && p < 5100) ? deleted : live).push_back(p);
   Source s;
   ASSERT_EQ(s.Open(tests::WriteScratch("src_large.dbf", tests::NumberedTable(count, deleted))), 0);
   std::vector<int> order(live.size());
   for (size_t i = 0; i < order.size(); ++i) order[i] = int(i);
-  std::mt19937 rng(20240229);
-  std::shuffle(order.begin(), order.end(), rng);
-  for (int n : order) {
-    ASSERT_EQ(s->GetRecord(n), 0) << n;
-    ASSERT_EQ(s.Text(0), "p" + std::to_string(live[size_t(n)])) << n;
-  }
-  EXPECT_EQ(s->GetRecord(int32_t(live.size())), ZQ_END);
+  std::shuffle(order.begin(), order.end(), std::mt19937(20240229));
+  for (int n : order) ASSERT_EQ(s.At(n), "p" + std::to_string(live[size_t(n)])) << n;
+  EXPECT_EQ(s.At(int32_t(live.size())), kEnd);
   EXPECT_EQ(s->EstimateRecordCount(), int64_t(live.size()));
   ZQDbase& db = DbaseTestPeer::Of(s.spoke());
   EXPECT_LE(DbaseTestPeer::RecordMap(db).Count(), 4096);  // bounded, whatever the table's size
   // Sequential after random: the same answers.
   BATCHERR rc;
-  std::vector<std::string> all = s.FirstColumn(&rc);
+  Rows all = s.FirstColumn(&rc);
   EXPECT_EQ(rc, ZQ_END);
   ASSERT_EQ(all.size(), live.size());
   for (size_t i = 0; i < all.size(); i += 997) EXPECT_EQ(all[i], "p" + std::to_string(live[i]));
 }
 
-TEST(SourceTest, EmptyTable) {
-  Bytes bytes = DbfBuilder(0x03).Field("NAME", 'C', 5).Field("N", 'N', 3).NoEndMark().Build();
-  Source s;
-  ASSERT_EQ(s.Open(tests::WriteScratch("src_empty.dbf", bytes)), 0);
-  EXPECT_EQ(s.FieldCount(), 2);
-  EXPECT_EQ(s->EstimateRecordCount(), 0);
-  EXPECT_EQ(s->GetRecord(0), ZQ_END);
-  EXPECT_TRUE(s.Field(0)->IsBlank());
-  EXPECT_TRUE(s.Field(1)->IsBlank());
-  EXPECT_EQ(s->GetRecord(3), ZQ_END);
-}
-
 TEST(SourceTest, RecordCountBeyondTheFileEndsCleanly) {
   tests::LogCapture log;
+  Source s;
+  ASSERT_EQ(s.Open(tests::WriteScratch("src_empty.dbf",
+                                       DbfBuilder(0x03).Field("NAME", 'C', 5).Field("N", 'N', 3).NoEndMark().Build())),
+            0);
+  EXPECT_EQ(s.FieldCount(), 2);
+  EXPECT_EQ(s->EstimateRecordCount(), 0);
+  EXPECT_EQ(s.At(0), kEnd);
+  EXPECT_TRUE(s.Field(0)->IsBlank());
+  EXPECT_TRUE(s.Field(1)->IsBlank());
+  EXPECT_EQ(s.At(3), kEnd);
+
   // The header promises 5 records; the file holds 2 and an end mark.
   Bytes bytes = DbfBuilder(0x03).Field("PHYS", 'C', 6).Record({"p0"}).Record({"p1"}).CountInHeader(5).Build();
-  Source s;
   ASSERT_EQ(s.Open(tests::WriteScratch("src_short.dbf", bytes)), 0);
   BATCHERR rc;
-  EXPECT_EQ(s.FirstColumn(&rc), (std::vector<std::string>{"p0", "p1"}));
+  EXPECT_EQ(s.FirstColumn(&rc), (Rows{"p0", "p1"}));
   EXPECT_EQ(rc, ZQ_END);
-  EXPECT_EQ(s->GetRecord(4), ZQ_END);
+  EXPECT_EQ(s.At(4), kEnd);
 
   // A count of 2^31 - 1 ends as soon as the file does, and a request for a
   // record far behind it too (a read per promised record would never end).
   PutLe32(&bytes[kWideRecCount], 0x7FFFFFFF);
   bytes.pop_back();  // no end mark either
   ASSERT_EQ(s.Open(tests::WriteScratch("src_huge.dbf", bytes)), 0);
-  EXPECT_EQ(s.FirstColumn(&rc), (std::vector<std::string>{"p0", "p1"}));
+  EXPECT_EQ(s.FirstColumn(&rc), (Rows{"p0", "p1"}));
   EXPECT_EQ(rc, ZQ_END);
-  EXPECT_EQ(s->GetRecord(2000000000), ZQ_END);
+  EXPECT_EQ(s.At(2000000000), kEnd);
   EXPECT_TRUE(log.entries().empty());
 }
 
@@ -228,7 +185,7 @@ TEST(SourceTest, FieldPastTheRecord) {
   tests::LogCapture log;
   // Fields of 3 + 4 bytes, records of 1 + 5: the second field runs past.
   Bytes bytes = DbfBuilder(0x03).Field("A", 'C', 3).Field("B", 'C', 4).RecordLength(6)
-                    .RawRecord(Rec({Str("abcde")})).RawRecord(Rec({Str("fghij")})).Build();
+                    .RawRecord(Rec({Text("abcde")})).RawRecord(Rec({Text("fghij")})).Build();
   Source s;
   ASSERT_EQ(s.Open(tests::WriteScratch("src_past.dbf", bytes)), 0);
   ASSERT_EQ(s.FieldCount(), 2);
@@ -242,18 +199,13 @@ TEST(SourceTest, FieldPastTheRecord) {
     EXPECT_EQ(log.entries()[0].level, 4);
     EXPECT_EQ(log.entries()[0].code, ZQ_READ_ERROR);
   }
-  EXPECT_EQ(s->GetRecord(2), ZQ_END);
+  EXPECT_EQ(s.At(2), kEnd);
 }
 
 TEST(SourceTest, MissingMemoFileByPolicy) {
   tests::LogCapture log;
-  Bytes bytes = DbfBuilder(0x83)
-                    .Field("NAME", 'C', 5)
-                    .Field("NOTE", 'M', 10)
-                    .Field("AGE", 'N', 3)
-                    .Record({"ann", "         1", " 42"})
-                    .Record({"bob", "          ", "  7"})
-                    .Build();
+  Bytes bytes = DbfBuilder(0x83).Field("NAME", 'C', 5).Field("NOTE", 'M', 10).Field("AGE", 'N', 3)
+                    .Record({"ann", "         1", " 42"}).Record({"bob", "          ", "  7"}).Build();
   std::string path = tests::WriteScratch("src_nomemo.dbf", bytes);
   {
     Source s(4, 0);
@@ -271,13 +223,11 @@ TEST(SourceTest, MissingMemoFileByPolicy) {
     ASSERT_EQ(s.Open(path), 0);
     ASSERT_EQ(s.FieldCount(), 3);
     EXPECT_EQ(s.Field(1)->DataType().Length(), 255);
-    ASSERT_EQ(s->GetRecord(0), 0);
-    EXPECT_EQ(s.Text(0), "ann");
+    EXPECT_EQ(s.At(0), "ann");
     EXPECT_TRUE(s.Field(1)->IsBlank());
     EXPECT_DOUBLE_EQ(s.Field(2)->DoubleVal(), 42);
-    ASSERT_EQ(s->GetRecord(1), 0);
-    EXPECT_EQ(s.Text(0), "bob");
-    EXPECT_EQ(s->GetRecord(2), ZQ_END);
+    EXPECT_EQ(s.At(1), "bob");
+    EXPECT_EQ(s.At(2), kEnd);
     EXPECT_TRUE(log.entries().empty());
   }
 }
@@ -286,10 +236,9 @@ TEST(SourceTest, MemoFailureAfterAnotherTableLeavesNothingToRead) {
   // A table read first leaves a small buffer and its layout; a second table
   // whose memo file is missing (policy 0) must not be read through them.
   Source s(2, 0);
-  ASSERT_EQ(s.Open(tests::WriteScratch("src_small.dbf",
-                                       DbfBuilder(0x03).Field("A", 'C', 1).Record({"a"}).Build())),
+  ASSERT_EQ(s.Open(tests::WriteScratch("src_small.dbf", DbfBuilder(0x03).Field("A", 'C', 1).Record({"a"}).Build())),
             0);
-  ASSERT_EQ(s->GetRecord(0), 0);
+  ASSERT_EQ(s.At(0), "a");
   DbfBuilder big(0x8B);
   big.Field("NOTE", 'M', 10).Field("TEXT", 'C', 250).Record({"         1", std::string(250, 'x')});
   tests::LogCapture log;
@@ -301,17 +250,11 @@ TEST(SourceTest, MemoFailureAfterAnotherTableLeavesNothingToRead) {
 TEST(SourceTest, VisualFoxProColumns) {
   // C3, I4, Y8, T8, B8 and the hidden _NullFlags as the last column.
   auto build = [](const char* last_name) {
-    return DbfBuilder(0x30)
-        .Field("ID", 'C', 3)
-        .Field("QTY", 'I', 4)
-        .Field("PRICE", 'Y', 8)
-        .Field("AT", 'T', 8)
-        .Field("RATE", 'B', 8)
-        .Field(last_name, '0', 1)
-        .HeaderExtra(263)
-        .RawRecord(Rec({Str("ab "), Le32(-7), Le64(15000), Le32(2451545), Le32(999), Dbl(2.25), Bytes{0}}))
-        .RawRecord(Rec({Str("cd "), Le32(123456), Le64(-15000), Le32(2451545 + 366), Le32(86398999),
-                        Dbl(-0.5), Bytes{0x10}}))
+    return DbfBuilder(0x30).Field("ID", 'C', 3).Field("QTY", 'I', 4).Field("PRICE", 'Y', 8).Field("AT", 'T', 8)
+        .Field("RATE", 'B', 8).Field(last_name, '0', 1).HeaderExtra(263)
+        .RawRecord(Rec({Text("ab "), Le32(uint32_t(-7)), Le64(15000), Le32(2451545), Le32(999), Dbl(2.25), {0}}))
+        .RawRecord(Rec({Text("cd "), Le32(123456), Le64(uint64_t(-15000)), Le32(2451545 + 366), Le32(86398999),
+                        Dbl(-0.5), {0x10}}))
         .Build();
   };
   for (const char* name : {"_NullFlags", "_NULLFLAGS", "_nullflags"}) {
@@ -324,8 +267,7 @@ TEST(SourceTest, VisualFoxProColumns) {
     EXPECT_EQ(s.Name(4), "RATE");
     EXPECT_EQ(s.Field(4)->DataType().Length(), 8);  // B is no memo here
 
-    ASSERT_EQ(s->GetRecord(0), 0);
-    EXPECT_EQ(s.Text(0), "ab");
+    EXPECT_EQ(s.At(0), "ab");
     EXPECT_EQ(s.Field(1)->LongVal(), -7);
     EXPECT_DOUBLE_EQ(s.Field(2)->DoubleVal(), 1.5);
     ASSERT_EQ(s.Field(3)->held(), ZQField::Held::kDateTime);
@@ -333,12 +275,11 @@ TEST(SourceTest, VisualFoxProColumns) {
     EXPECT_EQ(s.Field(3)->DateTimeRef().Seconds(), 1);  // 999 ms rounds to the second
     EXPECT_DOUBLE_EQ(s.Field(4)->DoubleVal(), 2.25);
 
-    ASSERT_EQ(s->GetRecord(1), 0);
+    EXPECT_EQ(s.At(1, 3), "2001-01-01T23:59:59");
     EXPECT_EQ(s.Field(1)->LongVal(), 123456);
     EXPECT_DOUBLE_EQ(s.Field(2)->DoubleVal(), -1.5);
-    EXPECT_EQ(s.Text(3), "2001-01-01T23:59:59");
     EXPECT_DOUBLE_EQ(s.Field(4)->DoubleVal(), -0.5);
-    EXPECT_EQ(s->GetRecord(2), ZQ_END);
+    EXPECT_EQ(s.At(2), kEnd);
   }
 
   // Anywhere but last, the column is a plain field.
@@ -347,32 +288,24 @@ TEST(SourceTest, VisualFoxProColumns) {
   ASSERT_EQ(m.Open(tests::WriteScratch("src_vfp_mid.dbf", middle)), 0);
   ASSERT_EQ(m.FieldCount(), 2);
   EXPECT_EQ(m.Name(0), "_NullFlags");
-  ASSERT_EQ(m->GetRecord(0), 0);
-  EXPECT_EQ(m.Text(1), "zz");
+  EXPECT_EQ(m.At(0, 1), "zz");
 
   // Read as dialect 5, which takes any version byte, the same table keeps the
   // column, reads B as a memo (blank here) and still decodes I, Y and T.
   Source five(5, 1);
   ASSERT_EQ(five.Open(tests::WriteScratch("src_vfp5.dbf", build("_NullFlags"))), 0);
   ASSERT_EQ(five.FieldCount(), 6);
-  ASSERT_EQ(five->GetRecord(0), 0);
-  EXPECT_EQ(five.Field(1)->LongVal(), -7);
+  EXPECT_EQ(five.At(0, 1), "-7");
   EXPECT_DOUBLE_EQ(five.Field(2)->DoubleVal(), 1.5);
   EXPECT_EQ(five.Field(3)->DateTimeRef().Days(), 730122);
   EXPECT_TRUE(five.Field(4)->IsBlank());
-}
 
-TEST(SourceTest, ShortBinaryFieldsDecodeWhatTheyHold) {
   // Widths the writer never makes: a Y of 4 bytes is sign-extended, an I of 2
   // bytes and a T of 4 bytes hold no full number.
-  Bytes bytes = DbfBuilder(0x30)
-                    .Field("Y4", 'Y', 4)
-                    .Field("I2", 'I', 2)
-                    .Field("T4", 'T', 4)
-                    .RawRecord(Rec({Le32(-30000), Bytes{0x05, 0x00}, Le32(2451545)}))
-                    .Build();
+  Bytes short_bin = DbfBuilder(0x30).Field("Y4", 'Y', 4).Field("I2", 'I', 2).Field("T4", 'T', 4)
+                        .RawRecord(Rec({Le32(uint32_t(-30000)), {0x05, 0x00}, Le32(2451545)})).Build();
   Source s(10);
-  ASSERT_EQ(s.Open(tests::WriteScratch("src_short_bin.dbf", bytes)), 0);
+  ASSERT_EQ(s.Open(tests::WriteScratch("src_short_bin.dbf", short_bin)), 0);
   ASSERT_EQ(s->GetRecord(0), 0);
   EXPECT_DOUBLE_EQ(s.Field(0)->DoubleVal(), -3.0);
   EXPECT_EQ(s.Field(1)->LongVal(), 0);
@@ -382,39 +315,33 @@ TEST(SourceTest, ShortBinaryFieldsDecodeWhatTheyHold) {
 
 TEST(SourceTest, CodePageConvertsTextFieldsOnly) {
   // 0x82 is é in code page 850; the I field holds the same byte in a number.
-  Bytes bytes = DbfBuilder(0x30)
-                    .Field("NAME", 'C', 6)
-                    .Field("NUM", 'I', 4)
-                    .RawRecord(Rec({Str("caf\x82  "), Bytes{0x82, 0, 0, 0}}))
-                    .Build();
+  Bytes bytes = DbfBuilder(0x30).Field("NAME", 'C', 6).Field("NUM", 'I', 4)
+                    .RawRecord(Rec({Text("caf\x82  "), {0x82, 0, 0, 0}})).Build();
   std::string path = tests::WriteScratch("src_cp.dbf", bytes);
-  Source converted(10, 0, 850);
+  Source converted(10, 0, 850), raw(10, 0, 0);
   ASSERT_EQ(converted.Open(path), 0);
-  ASSERT_EQ(converted->GetRecord(0), 0);
-  EXPECT_EQ(converted.Text(0), "caf\xC3\xA9");
+  EXPECT_EQ(converted.At(0), "caf\xC3\xA9");
   EXPECT_EQ(converted.Field(1)->LongVal(), 0x82);
-  Source raw(10, 0, 0);
   ASSERT_EQ(raw.Open(path), 0);
-  ASSERT_EQ(raw->GetRecord(0), 0);
-  EXPECT_EQ(raw.Text(0), "caf\x82");
+  EXPECT_EQ(raw.At(0), "caf\x82");
 }
 
-TEST(SourceTest, NarrowAndOverriddenDialects) {
+TEST(SourceTest, NarrowOverriddenAndUnknownTypeLetters) {
   // dBASE II: narrow header, 16-bit count.
   Bytes d2 = DbfBuilder(0x02, true).Field("NAME", 'C', 4).Field("N", 'N', 2).Record({"ann", "1"})
                  .Deleted({"bob", "2"}).Record({"cy", "3"}).Build();
   Source s(0);
   ASSERT_EQ(s.Open(tests::WriteScratch("src_d2.dbf", d2)), 0);
   BATCHERR rc;
-  EXPECT_EQ(s.FirstColumn(&rc), (std::vector<std::string>{"ann", "cy"}));
+  EXPECT_EQ(s.FirstColumn(&rc), (Rows{"ann", "cy"}));
   EXPECT_EQ(rc, ZQ_END);
   EXPECT_EQ(s->MaxFieldCount(), 32);
 
   // 0xF5 under dBASE IV: the table is FoxPro from then on, while the type
   // lists stay those of the option's dialect.
-  Bytes fox = DbfBuilder(0xF5).Field("NAME", 'C', 4).Record({"fox"}).Build();
   Source f(1, 1);
-  ASSERT_EQ(f.Open(tests::WriteScratch("src_f5.dbf", fox)), 0);
+  ASSERT_EQ(f.Open(tests::WriteScratch("src_f5.dbf", DbfBuilder(0xF5).Field("NAME", 'C', 4).Record({"fox"}).Build())),
+            0);
   EXPECT_EQ(f->TableHandle()->dialect, 6);
   EXPECT_EQ(f->MaxFieldCount(), 256);
   ZQString saved;
@@ -423,21 +350,18 @@ TEST(SourceTest, NarrowAndOverriddenDialects) {
   int types = 0;
   while (f->GetValidTypes()[types] != nullptr) ++types;
   EXPECT_EQ(types, 5);  // dialect 1's
-  ASSERT_EQ(f->GetRecord(0), 0);
-  EXPECT_EQ(f.Text(0), "fox");
-  EXPECT_STREQ(DbaseTestPeer::BasePath(DbaseTestPeer::Of(f.spoke())),
-               tests::ScratchPath("src_f5").c_str());
-}
+  EXPECT_EQ(f.At(0), "fox");
+  EXPECT_STREQ(DbaseTestPeer::BasePath(DbaseTestPeer::Of(f.spoke())), tests::ScratchPath("src_f5").c_str());
 
-TEST(SourceTest, UnknownTypeLetterReadsAsText) {
-  Bytes bytes = DbfBuilder(0x03).Field("ODD", 'Q', 3).Field("N", 'N', 2).Record({"q!", "5"}).Build();
-  Source s;
-  ASSERT_EQ(s.Open(tests::WriteScratch("src_odd.dbf", bytes)), 0);
-  ASSERT_EQ(s.FieldCount(), 2);
-  EXPECT_EQ(s.Field(0)->DataType().Family(), FT_TEXT);
-  ASSERT_EQ(s->GetRecord(0), 0);
-  EXPECT_EQ(s.Text(0), "q!");
-  EXPECT_DOUBLE_EQ(s.Field(1)->DoubleVal(), 5);
+  // An unknown type letter reads as text.
+  Source q;
+  ASSERT_EQ(q.Open(tests::WriteScratch("src_odd.dbf",
+                                       DbfBuilder(0x03).Field("ODD", 'Q', 3).Field("N", 'N', 2).Record({"q!", "5"}).Build())),
+            0);
+  ASSERT_EQ(q.FieldCount(), 2);
+  EXPECT_EQ(q.Field(0)->DataType().Family(), FT_TEXT);
+  EXPECT_EQ(q.At(0), "q!");
+  EXPECT_DOUBLE_EQ(q.Field(1)->DoubleVal(), 5);
 }
 
 }  // namespace

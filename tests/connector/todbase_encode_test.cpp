@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "tests/connector/todbase_harness.h"
+#include "tests/support/todbase_harness.h"
 
 namespace {
 

@@ -11,7 +11,7 @@
 #include <string>
 #include <vector>
 
-#include "tests/connector/todbase_harness.h"
+#include "tests/support/todbase_harness.h"
 
 namespace {
 
@@ -26,10 +26,12 @@ std::string Numbered(const std::string& name, int count, const std::vector<int>&
   return tests::WriteScratch(name, tests::NumberedTable(count, deleted));
 }
 
+using Lines = std::vector<std::string>;
+
 // The records of a table as "<flag><value>" with trailing blanks cut.
-std::vector<std::string> Rows(const std::string& path) {
+Lines Rows(const std::string& path) {
   Written w(path);
-  std::vector<std::string> out;
+  Lines out;
   for (int n = 0; n < w.count; ++n) {
     std::string r = w.Record(n);
     r.erase(r.find_last_not_of(' ') + 1);
@@ -38,7 +40,7 @@ std::vector<std::string> Rows(const std::string& path) {
   return out;
 }
 
-std::vector<std::string> LiveColumn(const std::string& path) {
+Lines LiveColumn(const std::string& path) {
   tests::Source s(2);
   EXPECT_EQ(s.Open(path), 0);
   return s.FirstColumn();
@@ -53,8 +55,7 @@ TEST(ToDbaseUpdateTest, PositionsCountLiveRecords) {
     ASSERT_EQ(t.Open(path), 0);
     EXPECT_EQ(t->Position(), 0);
     t->SetFilePosition(1);
-    t.Set(0, "L1");
-    ASSERT_EQ(t.Write(), 0);
+    ASSERT_EQ(t.Put({"L1"}), 0);
     EXPECT_EQ(t->Position(), 2);
     // A read goes on from the write: logical 2 is physical 4.
     ZQRecord r(t.Layout());
@@ -63,19 +64,15 @@ TEST(ToDbaseUpdateTest, PositionsCountLiveRecords) {
     EXPECT_EQ(pos, 2);
     EXPECT_EQ(std::string(r[0]->StringRef().c_str()), "p4");
     t->SetFilePosition(3);
-    t.Set(0, "L3");
-    ASSERT_EQ(t.Write(), 0);
+    ASSERT_EQ(t.Put({"L3"}), 0);
     // In a row from the start: every write on the next live record.
     t->_Rewind();
-    for (const char* v : {"a0", "a1", "a2", "a3", "a4", "a5"}) {
-      t.Set(0, v);
-      ASSERT_EQ(t.Write(), 0) << v;
-    }
+    for (const char* v : {"a0", "a1", "a2", "a3", "a4", "a5"}) ASSERT_EQ(t.Put({v}), 0) << v;
     EXPECT_EQ(t->UpdatedRecordCount(), 8);
     EXPECT_EQ(t->InsertedRecordCount(), 0);
     t.Close();
   }
-  EXPECT_EQ(Rows(path), (std::vector<std::string>{" a0", "*p1", " a1", "*p3", " a2", " a3", " a4", " a5"}));
+  EXPECT_EQ(Rows(path), (Lines{" a0", "*p1", " a1", "*p3", " a2", " a3", " a4", " a5"}));
 
   // A scan to the end first, as an update by key does, then writes by the
   // positions that the scan gave.
@@ -93,14 +90,12 @@ TEST(ToDbaseUpdateTest, PositionsCountLiveRecords) {
     EXPECT_EQ(positions, (std::vector<int64_t>{0, 1, 2, 3}));
     EXPECT_EQ(t->Position(), 4);
     for (int64_t p : {int64_t{2}, int64_t{0}, int64_t{3}}) {
-      t->SetFilePosition(p);
-      ASSERT_EQ(t->GetandDeleteRecord(t.Layout()), 0);
-      t.Set(0, ("u" + std::to_string(p)).c_str());
-      ASSERT_EQ(t.Write(), 0);
+      ASSERT_NE(t.Reread(p)[0], '#');
+      ASSERT_EQ(t.Put({("u" + std::to_string(p)).c_str()}), 0);
     }
     t.Close();
   }
-  EXPECT_EQ(Rows(path), (std::vector<std::string>{"*p0", " u0", " p2", "*p3", "*p4", " u2", " u3"}));
+  EXPECT_EQ(Rows(path), (Lines{"*p0", " u0", " p2", "*p3", "*p4", " u2", " u3"}));
 }
 
 TEST(ToDbaseUpdateTest, AppendingBehindTheLastRecord) {
@@ -113,19 +108,16 @@ TEST(ToDbaseUpdateTest, AppendingBehindTheLastRecord) {
     t.Add('C', "PHYS", 6);
     ASSERT_EQ(t.Open(path), 0);
     t->SetFilePosition(2);  // between the live count and the file's count
-    t.Set(0, "bad");
-    EXPECT_EQ(t.Write(), ZQ_WRITE_ERROR);
+    EXPECT_EQ(t.Put({"bad"}), ZQ_WRITE_ERROR);
     EXPECT_EQ(log.Last(), "Error -1 returned from dbput");
     EXPECT_EQ(t->Position(), 3);  // moves on all the same
     t->SetFilePosition(1);
-    t.Set(0, "n1");
-    ASSERT_EQ(t.Write(), 0);
-    t.Set(0, "n2");
-    ASSERT_EQ(t.Write(), 0);
+    ASSERT_EQ(t.Put({"n1"}), 0);
+    ASSERT_EQ(t.Put({"n2"}), 0);
     t.Close();
   }
-  EXPECT_EQ(Rows(path), (std::vector<std::string>{" p0", "*p1", "*p2", " n1", " n2"}));
-  EXPECT_EQ(LiveColumn(path), (std::vector<std::string>{"p0", "n1", "n2"}));
+  EXPECT_EQ(Rows(path), (Lines{" p0", "*p1", "*p2", " n1", " n2"}));
+  EXPECT_EQ(LiveColumn(path), (Lines{"p0", "n1", "n2"}));
 
   // A record appended in this run is found again by its logical number and
   // rewritten in place (an update that meets the same key twice).
@@ -139,16 +131,12 @@ TEST(ToDbaseUpdateTest, AppendingBehindTheLastRecord) {
     while (t->GetRecord(scan, &pos) == 0) {
     }
     t->Unwind();
-    t.Set(0, "new");
-    ASSERT_EQ(t.Write(), 0);
-    t->SetFilePosition(1);
-    ASSERT_EQ(t->GetandDeleteRecord(t.Layout()), 0);
-    EXPECT_EQ(std::string(t[0]->StringRef().c_str()), "new");
-    t.Set(0, "again");
-    ASSERT_EQ(t.Write(), 0);
+    ASSERT_EQ(t.Put({"new"}), 0);
+    EXPECT_EQ(t.Reread(1), "new");
+    ASSERT_EQ(t.Put({"again"}), 0);
     t.Close();
   }
-  EXPECT_EQ(Rows(path), (std::vector<std::string>{"*p0", " p1", " again"}));
+  EXPECT_EQ(Rows(path), (Lines{"*p0", " p1", " again"}));
 
   // Append mode starts behind the last record; Unwind goes there again, and
   // SetFilePosition to the record count appends; one further fails.
@@ -159,18 +147,15 @@ TEST(ToDbaseUpdateTest, AppendingBehindTheLastRecord) {
     t.Add('C', "PHYS", 6);
     ASSERT_EQ(t.Open(path), 0);
     EXPECT_EQ(t->Position(), 3);
-    t.Set(0, "a3");
-    ASSERT_EQ(t.Write(), 0);
+    ASSERT_EQ(t.Put({"a3"}), 0);
     t->_Rewind();
     t->Unwind();
     EXPECT_EQ(t->Position(), 4);
     t->SetFilePosition(5);
-    t.Set(0, "gap");
-    EXPECT_EQ(t.Write(), ZQ_WRITE_ERROR);
+    EXPECT_EQ(t.Put({"gap"}), ZQ_WRITE_ERROR);
     EXPECT_EQ(log.Last(), "Error -1 returned from dbput");
     t->SetFilePosition(4);
-    t.Set(0, "a4");
-    ASSERT_EQ(t.Write(), 0);
+    ASSERT_EQ(t.Put({"a4"}), 0);
     EXPECT_EQ(t->InsertedRecordCount(), 2);
     // Reading: the last record leaves the position at the count; then 1.
     ZQRecord r(t.Layout());
@@ -183,7 +168,7 @@ TEST(ToDbaseUpdateTest, AppendingBehindTheLastRecord) {
     EXPECT_EQ(t->Position(), 5);
     t.Close();
   }
-  EXPECT_EQ(Rows(path), (std::vector<std::string>{" p0", " p1", " p2", " a3", " a4"}));
+  EXPECT_EQ(Rows(path), (Lines{" p0", " p1", " p2", " a3", " a4"}));
 }
 
 // Memo block numbers as the record holds them, one kind per dialect.
@@ -202,21 +187,16 @@ TEST(ToDbaseUpdateTest, MemoBlocksOnRewrite) {
       t.Add('C', "ID", 2);
       t.Add('M', "NOTE");
       ASSERT_EQ(t.Open(path), 0);
-      t.Set(0, "a");
-      t.Set(1, "hello");
-      ASSERT_EQ(t.Write(), 0);
-      t.Set(0, "b");
-      t.Set(1, long_text.c_str());
-      ASSERT_EQ(t.Write(), 0);
+      ASSERT_EQ(t.Put({"a", "hello"}), 0);
+      ASSERT_EQ(t.Put({"b", long_text.c_str()}), 0);
       t.Close();
     }
     const char* ext = dialect == 6 ? "fpt" : dialect == 8 ? "smt" : "dbt";
     std::string memo_path = ScratchPath("memo_upd_" + std::to_string(dialect) + "." + ext);
     Bytes memo_before = tests::ReadFile(memo_path);
     uint32_t first = Pointer(Written(path).Record(0).substr(3), dialect);
-    uint32_t second = Pointer(Written(path).Record(1).substr(3), dialect);
     ASSERT_NE(first, 0u);
-    ASSERT_NE(second, 0u);
+    ASSERT_NE(Pointer(Written(path).Record(1).substr(3), dialect), 0u);
     {
       Target t(dialect, 2);
       t.Add('C', "ID", 2);
@@ -224,16 +204,12 @@ TEST(ToDbaseUpdateTest, MemoBlocksOnRewrite) {
       ASSERT_EQ(t.Open(path), 0);
       // The same text again: the block is kept and the memo file unchanged
       // (SMT memos are always stored anew).
-      t->SetFilePosition(0);
-      ASSERT_EQ(t->GetandDeleteRecord(t.Layout()), 0);
-      EXPECT_EQ(std::string(t[1]->StringRef().c_str()), "hello");
+      EXPECT_EQ(t.Reread(0, 1), "hello");
       ASSERT_EQ(t.Write(), 0);
       // A blank memo gives the old blocks up and stores ten digits 0.
       t->SetFilePosition(1);
       ASSERT_EQ(t->DeleteRecord(), 0);
-      t.Set(0, "b");
-      t.Set(1, nullptr);
-      ASSERT_EQ(t.Write(), 0);
+      ASSERT_EQ(t.Put({"b", nullptr}), 0);
       EXPECT_EQ(t->DeletedRecordCount(), 1);
       EXPECT_EQ(t->UpdatedRecordCount(), 2);
       EXPECT_EQ(t->InsertedRecordCount(), 0);
@@ -242,22 +218,15 @@ TEST(ToDbaseUpdateTest, MemoBlocksOnRewrite) {
     Written w(path);
     ASSERT_EQ(w.count, 2);
     std::string r0 = w.Record(0).substr(3), r1 = w.Record(1).substr(3);
-    if (dialect == 8) {
-      EXPECT_NE(Pointer(r0, dialect), first);
-      EXPECT_EQ(r1, std::string(10, '\0'));
-    } else {
-      EXPECT_EQ(Pointer(r0, dialect), first);
-      EXPECT_EQ(r1, "0000000000");
-    }
+    EXPECT_EQ(Pointer(r0, dialect) == first, dialect != 8);
+    EXPECT_EQ(r1, dialect == 8 ? std::string(10, '\0') : "0000000000");
     if (dialect == 1 || dialect == 6) {
       EXPECT_EQ(tests::ReadFile(memo_path), memo_before);
     }
     tests::Source s(dialect);
     ASSERT_EQ(s.Open(path), 0);
-    ASSERT_EQ(s->GetRecord(0), 0);
-    EXPECT_EQ(s.Text(1), "hello");
-    ASSERT_EQ(s->GetRecord(1), 0);
-    EXPECT_EQ(s.Text(1), "");
+    EXPECT_EQ(s.At(0, 1), "hello");
+    EXPECT_EQ(s.At(1, 1), "");
   }
 }
 
@@ -272,10 +241,7 @@ TEST(ToDbaseUpdateTest, BlankMemoGivesDbase4BlocksUp) {
       Target t(2, 0);
       t.Add('M', "NOTE");
       ASSERT_EQ(t.Open(path), 0);
-      for (int i = 0; i < 3; ++i) {
-        t.Set(0, (text + std::to_string(i)).c_str());
-        ASSERT_EQ(t.Write(), 0);
-      }
+      for (int i = 0; i < 3; ++i) ASSERT_EQ(t.Put({(text + std::to_string(i)).c_str()}), 0);
       t.Close();
     }
     ASSERT_EQ(Pointer(Written(path).Record(1).substr(1), 2), 3u);
@@ -291,11 +257,9 @@ TEST(ToDbaseUpdateTest, BlankMemoGivesDbase4BlocksUp) {
       ASSERT_EQ(t.Open(path), 0);
       t->SetFilePosition(1);
       ASSERT_EQ(t->DeleteRecord(), 0);
-      t.Set(0, nullptr);
-      ASSERT_EQ(t.Write(), 0);
+      ASSERT_EQ(t.Put({nullptr}), 0);
       t->Unwind();
-      t.Set(0, "new");
-      ASSERT_EQ(t.Write(), 0);
+      ASSERT_EQ(t.Put({"new"}), 0);
       t.Close();
     }
     Written w(path);
@@ -315,7 +279,7 @@ TEST(ToDbaseUpdateTest, BlankMemoGivesDbase4BlocksUp) {
     }
     tests::Source s(2);
     ASSERT_EQ(s.Open(path), 0);
-    EXPECT_EQ(s.FirstColumn(), (std::vector<std::string>{text + "0", "", text + "2", "new"}));
+    EXPECT_EQ(s.FirstColumn(), (Lines{text + "0", "", text + "2", "new"}));
   }
 }
 
@@ -327,8 +291,7 @@ TEST(ToDbaseUpdateTest, CountersAndDeleteWithoutMemo) {
   EXPECT_EQ(t->DeleteRecord(), 0);  // no memo file: nothing read, nothing counted
   EXPECT_EQ(t->DeletedRecordCount(), 0);
   EXPECT_EQ(t->DeleteRecord(0, u"PHYS = 'p0'"), ZQ_NOT_SUPPORTED);
-  t.Set(0, "x");
-  ASSERT_EQ(t.Write(), 0);
+  ASSERT_EQ(t.Put({"x"}), 0);
   t->Unwind();
   ASSERT_EQ(t.Write(), 0);  // an append in mode 2 counts as an update too
   EXPECT_EQ(t->UpdatedRecordCount(), 2);
@@ -350,29 +313,26 @@ TEST(ToDbaseUpdateTest, CountersAndDeleteWithoutMemo) {
 TEST(ToDbaseUpdateTest, CloseWithoutKeeping) {
   // Replace mode: neither the table nor its memo file stays.
   std::string path = ScratchPath("nokeep.dbf");
-  std::string memo = ScratchPath("nokeep.dbt");
   {
     Target t(2, 0);
     t.Add('M', "NOTE");
     ASSERT_EQ(t.Open(path), 0);
-    t.Set(0, "text");
-    ASSERT_EQ(t.Write(), 0);
+    ASSERT_EQ(t.Put({"text"}), 0);
     EXPECT_EQ(t.Close(false), 0);
     EXPECT_EQ(t.Close(false), 0);  // a second close does nothing
   }
   EXPECT_FALSE(ZQFileProxy::fileExists(path.c_str()));
-  EXPECT_FALSE(ZQFileProxy::fileExists(memo.c_str()));
+  EXPECT_FALSE(ZQFileProxy::fileExists(ScratchPath("nokeep.dbt").c_str()));
   // Append mode: the table stays with what was written.
   path = Numbered("nokeep_append.dbf", 1, {});
   {
     Target t(2, 1);
     t.Add('C', "PHYS", 6);
     ASSERT_EQ(t.Open(path), 0);
-    t.Set(0, "kept");
-    ASSERT_EQ(t.Write(), 0);
+    ASSERT_EQ(t.Put({"kept"}), 0);
     EXPECT_EQ(t.Close(false), 0);
   }
-  EXPECT_EQ(LiveColumn(path), (std::vector<std::string>{"p0", "kept"}));
+  EXPECT_EQ(LiveColumn(path), (Lines{"p0", "kept"}));
   // A failed open leaves nothing to close.
   Target t(2, 0);
   t.Add('C', "PHYS", 6);

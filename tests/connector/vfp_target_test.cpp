@@ -8,7 +8,7 @@
 #include <string>
 
 #include "host/zqdate.h"
-#include "tests/connector/todbase_harness.h"
+#include "tests/support/todbase_harness.h"
 #include "tests/support/memo_builder.h"
 
 namespace {

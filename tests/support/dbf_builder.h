@@ -12,6 +12,7 @@
 #include <cstdint>
 #include <cstdio>
 #include <cstdlib>
+#include <cstring>
 #include <string>
 #include <vector>
 
@@ -144,6 +145,30 @@ class DbfBuilder {
   std::vector<FieldSpec> fields_;
   std::vector<Bytes> records_;
 };
+
+// Pieces of raw records: text, little-endian numbers, a double; Rec joins
+// them behind a flag byte.
+inline Bytes Text(const std::string& s) { return Bytes(s.begin(), s.end()); }
+inline Bytes Le32(uint32_t v) {
+  Bytes b(4);
+  PutLe32(b.data(), v);
+  return b;
+}
+inline Bytes Le64(uint64_t v) {
+  Bytes b(8);
+  PutLe64(b.data(), v);
+  return b;
+}
+inline Bytes Dbl(double d) {
+  uint64_t raw;
+  memcpy(&raw, &d, 8);
+  return Le64(raw);
+}
+inline Bytes Rec(std::initializer_list<Bytes> parts, uint8_t flag = ' ') {
+  Bytes r{flag};
+  for (const Bytes& p : parts) r.insert(r.end(), p.begin(), p.end());
+  return r;
+}
 
 // A dBASE III table of one column PHYS C(6) holding "p<physical number>",
 // the records whose numbers are in `deleted` marked deleted: positions and

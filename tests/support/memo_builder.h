@@ -19,7 +19,6 @@
 
 namespace tests {
 
-inline Bytes Text(const std::string& s) { return Bytes(s.begin(), s.end()); }
 
 // Headers of the four layouts, 512 bytes each.
 inline Bytes Db3Header(uint32_t next) {

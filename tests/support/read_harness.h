@@ -98,6 +98,13 @@ class Source {
     const ZQString& s = Field(i)->StringRef();
     return std::string(s.c_str(), size_t(s.length()));
   }
+  // Field `field`'s text of record `n`, or "#<result>" when GetRecord fails
+  // (`End()` for ZQ_END).
+  std::string At(int32_t n, int field = 0) {
+    BATCHERR rc = spoke_->GetRecord(n);
+    return rc == 0 ? Text(field) : "#" + std::to_string(rc);
+  }
+  static std::string End() { return "#" + std::to_string(ZQ_END); }
   // Field 0's text of every record from 0 until GetRecord stops; `rc` gets
   // the result that stopped it.
   std::vector<std::string> FirstColumn(BATCHERR* rc = nullptr, int limit = 1000000) {

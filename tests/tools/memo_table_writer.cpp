@@ -1,9 +1,6 @@
 // Writes a table with memos through the plain functions alone: dbcreat,
-// dbopen (writable), putmemo, dbput, dbclose. The interop test plain_memo.py
-// reads what it writes with other programs; the memo bench times its append.
+// dbopen (writable), putmemo, dbput, dbclose. The memo bench times it.
 //
-//   memo_table_writer OUT.dbf DIALECT N            writes N records and prints
-//       each as a JSON line: the values a reader must give back
 //   memo_table_writer OUT.dbf DIALECT N --append   appends N records with one
 //       memo each of 0 to 2,000 bytes; prints nothing
 //
@@ -33,26 +30,6 @@ constexpr int kName = 0, kNameLen = 20, kQty = 20, kQtyLen = 8, kBorn = 28, kOk 
 constexpr int kRecord = 47;
 constexpr int kFieldCount = 5;
 
-// Memo lengths of the written test table, record by record: empty, one byte,
-// both sides of the 512-byte block edge (504 fills a dBASE IV or FoxPro block
-// with its 8-byte head), and a memo that spans ten blocks.
-constexpr size_t kTestLengths[] = {0, 1, 511, 512, 513, 5000, 40, 504, 1000};
-constexpr size_t kTestLengthCount = sizeof kTestLengths / sizeof kTestLengths[0];
-
-// Multi-line text of `len` bytes for record `i`: numbered words, a CR LF
-// after every third and a bare LF after every seventh. Other readers strip
-// blanks at the ends of a memo, so its ends are letters.
-std::string TestText(int i, size_t len) {
-  std::string s;
-  for (size_t k = 0; s.size() < len; ++k) {
-    s += "line " + std::to_string(i) + "." + std::to_string(k);
-    s += k % 7 == 6 ? "\n" : k % 3 == 2 ? "\r\n" : " ";
-  }
-  s.resize(len);
-  if (!s.empty()) s.front() = 'm', s.back() = 'x';
-  return s;
-}
-
 // Writes the memo pointer of `block` into the record at `dest`, in the form
 // the memo kind keeps in records. An empty memo is blanks or ten zero digits
 // (both mean none; `zeros` picks one), and ten zero bytes for SMT.
@@ -76,21 +53,9 @@ void PutPointer(char* dest, const ZQDBFILE* t, uint32_t block, size_t length, bo
   memcpy(dest, digits, ZQMemoBlockNumber::string_length);
 }
 
-void AppendJson(const std::string& s, std::string* out) {
-  *out += '"';
-  for (char c : s) {
-    if (c == '"' || c == '\\') *out += '\\', *out += c;
-    else if (c == '\n') *out += "\\n";
-    else if (c == '\r') *out += "\\r";
-    else *out += c;
-  }
-  *out += '"';
-}
-
-// The plain fields of record `i` into `rec`; their values as JSON members
-// (NAME to OK) into `json`. Every seventh date and every fifth logical is
-// blank, which readers give as null.
-void FillRecord(int i, char* rec, std::string* json) {
+// The plain fields of record `i` into `rec`. Every seventh date and every
+// fifth logical is blank.
+void FillRecord(int i, char* rec) {
   memset(rec, ' ', kRecord);
   char buf[64];
   int n = snprintf(buf, sizeof buf, "name %d", i);
@@ -105,63 +70,13 @@ void FillRecord(int i, char* rec, std::string* json) {
     memcpy(rec + kBorn, buf, 8);
   }
   rec[kOk] = blank_flag ? '?' : i % 2 ? 'T' : 'F';
-  if (json == nullptr) return;
-  *json = "{\"NAME\":\"name " + std::to_string(i) + "\"";
-  snprintf(buf, sizeof buf, ",\"QTY\":%.2f,\"BORN\":", qty);
-  *json += buf;
-  if (blank_date) {
-    *json += "null";
-  } else {
-    snprintf(buf, sizeof buf, "\"%04d-%02d-%02d\"", year, month, day);
-    *json += buf;
-  }
-  *json += ",\"OK\":";
-  *json += blank_flag ? "null" : i % 2 ? "true" : "false";
 }
 
-// Stores `text` replacing the memo at `old` (0: none). The block, or 0 with
-// the failure reported.
-uint32_t Store(ZQDBFILE* t, uint32_t old, const ZQString& text, int i) {
-  uint32_t block = putmemo(t, old, text);
+// Stores `text` as a new memo. The block, or 0 with the failure reported.
+uint32_t Store(ZQDBFILE* t, const ZQString& text, int i) {
+  uint32_t block = putmemo(t, 0, text);
   if (block == 0) fprintf(stderr, "memo_table_writer: putmemo failed at record %d\n", i);
   return block;
-}
-
-// The test table: the lengths of kTestLengths in turn; every fourth memo is
-// then replaced by a shorter text (which stays in its blocks) and that by a
-// longer one (which outgrows them), as an update of the record would.
-bool WriteTestRecords(ZQDBFILE* t, int n) {
-  char rec[kRecord];
-  std::string line;
-  for (int i = 0; i < n; ++i) {
-    FillRecord(i, rec, &line);
-    std::string memo = TestText(i, kTestLengths[size_t(i) % kTestLengthCount]);
-    uint32_t block = 0;
-    if (!memo.empty() && (block = Store(t, 0, ZQString(memo.data(), int32_t(memo.size())), i)) == 0) return false;
-    PutPointer(rec + kNote, t, block, memo.size(), i % 2 == 1);
-    if (dbput(t, rec, i, 1) != 0) {
-      fprintf(stderr, "memo_table_writer: dbput failed at record %d\n", i);
-      return false;
-    }
-    if (i % 4 == 3 && block != 0) {
-      std::string shorter = memo.substr(0, memo.size() / 2) + "x";
-      std::string longer = shorter + std::string(700, 'y') + "\r\nx";
-      if ((block = Store(t, block, ZQString(shorter.data(), int32_t(shorter.size())), i)) == 0) return false;
-      if ((block = Store(t, block, ZQString(longer.data(), int32_t(longer.size())), i)) == 0) return false;
-      memo = longer;
-      PutPointer(rec + kNote, t, block, memo.size(), false);
-      if (dbput(t, rec, i, 1) != 0) {
-        fprintf(stderr, "memo_table_writer: dbput of a replacement failed at record %d\n", i);
-        return false;
-      }
-    }
-    line += ",\"NOTE\":";
-    if (memo.empty()) line += "null";
-    else AppendJson(memo, &line);
-    line += "}\n";
-    fputs(line.c_str(), stdout);
-  }
-  return true;
 }
 
 // The append bench: N records, memos of 0 to 2,000 bytes cut from one text
@@ -174,12 +89,12 @@ bool AppendRecords(ZQDBFILE* t, int n) {
   if (!text.Allocate(2001)) return false;
   char rec[kRecord];
   for (int i = 0; i < n; ++i) {
-    FillRecord(i, rec, nullptr);
+    FillRecord(i, rec);
     int32_t len = int32_t((int64_t{i} * 7919) % 2001);
     uint32_t block = 0;
     if (len > 0) {
       text.CopyN(source.data(), len, i % 97);
-      if ((block = Store(t, 0, text, i)) == 0) return false;
+      if ((block = Store(t, text, i)) == 0) return false;
     }
     PutPointer(rec + kNote, t, block, size_t(len), false);
     if (dbput(t, rec, i, 1) != 0) {
@@ -193,9 +108,8 @@ bool AppendRecords(ZQDBFILE* t, int n) {
 }  // namespace
 
 int main(int argc, char** argv) {
-  bool append = argc == 5 && strcmp(argv[4], "--append") == 0;
-  if (argc != 4 && !append) {
-    fprintf(stderr, "usage: memo_table_writer OUT.dbf DIALECT N [--append]\n");
+  if (argc != 5 || strcmp(argv[4], "--append") != 0) {
+    fprintf(stderr, "usage: memo_table_writer OUT.dbf DIALECT N --append\n");
     return 2;
   }
   const char* path = argv[1];
@@ -232,7 +146,7 @@ int main(int argc, char** argv) {
     fprintf(stderr, "memo_table_writer: dbopen failed or opened another shape\n");
     return 1;
   }
-  bool ok = append ? AppendRecords(t, n) : WriteTestRecords(t, n);
+  bool ok = AppendRecords(t, n);
   if (dbclose(open_fields, t) != 0) {
     fprintf(stderr, "memo_table_writer: dbclose failed\n");
     return 1;

@@ -1,7 +1,7 @@
 """Tables that `zqdb convert` writes, read back by zqdb, python3-dbfread and
 python3-dbf: a table of each dialect 0-9 converted to a new table of each
-other dialect, memos included where both sides have them; and CSV -> table
--> CSV giving the input back.
+other dialect and of Visual FoxPro (10), memos included where both sides have
+them; and CSV -> table -> CSV giving the input back.
 
 What the other readers can't do, seen here:
 - Neither reads the narrow dBASE II / Enable header (dialects 0 and 3).
@@ -30,8 +30,8 @@ from dbfread.field_parser import FieldParser  # noqa: E402
 D = datetime.date
 Dec = decimal.Decimal
 
-HAS_MEMO = {1, 2, 4, 5, 6, 7, 8, 9}
-HAS_FLOAT = {2, 6, 7, 9}
+HAS_MEMO = {1, 2, 4, 5, 6, 7, 8, 9, 10}
+HAS_FLOAT = {2, 6, 7, 9, 10}
 DB4_MEMO = {2, 5, 9}  # new memo files of these dialects are dBASE IV's
 TEXT = 255  # memos folded into text keep this much
 
@@ -147,7 +147,7 @@ with workdir() as d:
         s.check("CSV to dialect %d" % dialect, rc == 0, err.strip())
 
     for a in range(10):
-        for b in range(10):
+        for b in range(11):
             if a == b:
                 continue
             label = "%d->%d" % (a, b)
@@ -161,7 +161,7 @@ with workdir() as d:
                 want = expected(memo)
                 fields = zqdb_fields(dst, "--dialect", str(b), *CP)
                 rate = "F" if a in HAS_FLOAT and b in HAS_FLOAT else "N"
-                note = ("NOTE", "M", 10, 0) if memo else ("NOTE", "C", TEXT, 0)
+                note = ("NOTE", "M", 4 if b == 10 else 10, 0) if memo else ("NOTE", "C", TEXT, 0)
                 s.check(label + " fields", fields == [("NAME", "C", 20, 0), ("QTY", "N", 6, 0), ("AMOUNT", "N", 10, 2),
                                                       ("RATE", rate, 12, 4), ("BORN", "D", 8, 0), ("OK", "L", 1, 0),
                                                       note], str(fields))
@@ -172,7 +172,9 @@ with workdir() as d:
                 if b not in (0, 3):
                     compare(s, label + " dbfread", other, dbfread_rows(dst, b),
                             skip=("NOTE",) if b in (7, 8) and memo else ())
-                if version in (0x03, 0x83, 0xF5):
+                if b == 10:
+                    s.check(label + " memo file", os.path.exists(dst[:-3] + "fpt") == memo)
+                if version in (0x03, 0x83, 0xF5, 0x30):
                     compare(s, label + " python3-dbf", other, pydbf_rows(dst))
 
     # CSV -> table -> CSV: the input back, for values within the inferred

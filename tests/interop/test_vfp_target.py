@@ -1,10 +1,8 @@
 """New Visual FoxPro tables (dialect 10) that `zqdb convert --to 10` writes,
 read back by zqdb, python3-dbfread and python3-dbf; and records added to and
-replaced in a Visual FoxPro table that python3-dbf wrote.
+replaced in a Visual FoxPro table that python3-dbf wrote. (Tables of the other
+dialects converted to dialect 10 are read in test_convert.py.)
 
-- From a table of each dialect 0-9 (made from one CSV file): text, numbers,
-  floats, dates, logicals and memos (folded into text where the source has
-  no memo type).
 - From CSV with the types of dialect 10: integers, currencies, doubles,
   date-times and memos, one of them long enough for many 64-byte blocks.
 - python3-dbf appends to a table that zqdb made, and zqdb appends to and
@@ -35,17 +33,6 @@ Dec = decimal.Decimal
 CP = ["--codepage", "1252"]
 
 LONG = "".join("line %03d of a long memo, " % i for i in range(30)) + "end"  # 753 bytes: 12 blocks of 64
-TEXT = 255  # a memo folded into a text field keeps this much
-
-# Tables of dialects 0-9: the types they all share, and a memo.
-BASIC_SCHEMA = "NAME C(20), QTY N(6), AMOUNT N(10,2), RATE F(12,4), BORN D, OK L, NOTE M"
-BASIC = [
-    ("Ann Lee", 42, Dec("1234.50"), Dec("0.1250"), D(1970, 1, 1), True, "first line\r\nsecond line"),
-    ("Bob", -7, Dec("-0.75"), Dec("-12.5000"), D(2000, 2, 29), False, LONG),
-    ("Chloé", 0, Dec("0.00"), Dec("0.0000"), None, False, ""),
-]
-BASIC_NAMES = ("NAME", "QTY", "AMOUNT", "RATE", "BORN", "OK", "NOTE")
-
 # CSV with the types of dialect 10.
 VFP_SCHEMA = "ID I, NAME C(20), NOTE M, PRICE Y, WHEN T, RATE B, BORN D, OK L, AMT N(10,2)"
 VFP_NAMES = ("ID", "NAME", "NOTE", "PRICE", "WHEN", "RATE", "BORN", "OK", "AMT")
@@ -145,24 +132,6 @@ def fpt_next_free(path):
 s = Suite("vfp_target")
 
 with workdir() as d:
-    # From a table of each other dialect.
-    basic_csv = os.path.join(d, "basic.csv")
-    write_csv(basic_csv, BASIC_NAMES, BASIC)
-    for dialect in range(10):
-        label = "dialect %d to 10" % dialect
-        with s.case(label):
-            src = os.path.join(d, "s%d.dbf" % dialect)
-            dst = os.path.join(d, "v%d.dbf" % dialect)
-            rc, _, err = run([ZQDB, "convert", basic_csv, src, "--to", str(dialect), "--schema", BASIC_SCHEMA, *CP])
-            s.check(label + " source", rc == 0, err.strip())
-            rc, _, err = run([ZQDB, "convert", src, dst, "--dialect", str(dialect), "--to", "10", *CP])
-            if not s.check(label + " convert", rc == 0, err.strip()):
-                continue
-            memo = dialect not in (0, 3)
-            want = [r[:6] + ((r[6] if memo else r[6][:TEXT].rstrip(" ")),) for r in BASIC]
-            all_readers(s, label, dst, BASIC_NAMES, want)
-            s.check(label + " memo file", os.path.exists(dst[:-3] + "fpt") == memo)
-
     # From CSV with integers, currencies, doubles and date-times.
     vfp_csv = os.path.join(d, "vfp.csv")
     write_csv(vfp_csv, VFP_NAMES, VFP)

@@ -37,19 +37,8 @@ TEST(BadInputTest, TablesThatDontOpen) {
   // Which headers dbopen refuses is tested at the table layer; here, the one
   // message and the closed spoke that any refusal gives.
   Bytes good = Good();
-  Bytes version = good;
-  version[0] = 0x31;
-  struct Case {
-    const char* name;
-    Bytes bytes;
-    int dialect;
-  } cases[] = {
-      {"bad_empty.dbf", {}, 2},
-      {"bad_cut40.dbf", Bytes(good.begin(), good.begin() + 40), 2},
-      {"bad_version10.dbf", version, 10},
-      {"bad_d2memo.dbf", DbfBuilder(0x02, true).Field("NOTE", 'M', 10).Build(), 0},
-  };
-  for (const Case& c : cases) ExpectRefused(c.name, c.bytes, c.dialect);
+  ExpectRefused("bad_cut40.dbf", Bytes(good.begin(), good.begin() + 40));
+  ExpectRefused("bad_d2memo.dbf", DbfBuilder(0x02, true).Field("NOTE", 'M', 10).Build(), 0);
 
   // Missing, and a name longer than any path the platform takes.
   for (const std::string& path : {tests::ScratchPath("bad_missing.dbf"), std::string(5000, 'x')}) {

@@ -2,6 +2,8 @@
 // keyword reader, path helpers, code pages and dates.
 #include <gtest/gtest.h>
 
+#include <array>
+#include <cstdio>
 #include <cstring>
 #include <string>
 
@@ -49,92 +51,74 @@ TEST(ZQHashTableTest, StaysBoundedAndFindsTheLargestKeyNotAbove) {
   EXPECT_EQ(found, 4);
 }
 
-TEST(MessageFormatTest, WideNarrowNumbersAndPositions) {
+template <typename... Args>
+std::string Fmt(const wchar* format, Args... args) {
   ZQString out;
-  FormatMessage(out, u"Error opening data file %s", u"/tmp/t\u00e9.dbf");
-  EXPECT_EQ(Text(out), "Error opening data file /tmp/t\xC3\xA9.dbf");  // wide in, UTF-8 out
-  FormatMessage(out, u"narrow %S, also %hs", "a.dbf", "b");
-  EXPECT_EQ(Text(out), "narrow a.dbf, also b");
-  FormatMessage(out, u"Error retrieving record %ld", int32_t(-17));
-  EXPECT_EQ(Text(out), "Error retrieving record -17");
-  FormatMessage(out, u"Field %d extends beyond end of record", int32_t(3));
-  EXPECT_EQ(Text(out), "Field 3 extends beyond end of record");
-  FormatMessage(out, u"%lld|%5d|%-3d|%03d|%x|%%", int64_t{1} << 40, int32_t(42), int32_t(7), int32_t(5),
-                int32_t(255));
-  EXPECT_EQ(Text(out), "1099511627776|   42|7  |005|ff|%");
+  FormatMessage(out, format, args...);
+  return Text(out);
+}
+
+TEST(MessageFormatTest, WideNarrowNumbersAndPositions) {
+  EXPECT_EQ(Fmt(u"Error opening data file %s", u"/tmp/t\u00e9.dbf"),
+            "Error opening data file /tmp/t\xC3\xA9.dbf");  // wide in, UTF-8 out
+  EXPECT_EQ(Fmt(u"narrow %S, also %hs", "a.dbf", "b"), "narrow a.dbf, also b");
+  EXPECT_EQ(Fmt(u"Error retrieving record %ld", int32_t(-17)), "Error retrieving record -17");
+  EXPECT_EQ(Fmt(u"Field %d extends beyond end of record", int32_t(3)), "Field 3 extends beyond end of record");
+  EXPECT_EQ(Fmt(u"%lld|%5d|%-3d|%03d|%x|%%", int64_t{1} << 40, int32_t(42), int32_t(7), int32_t(5), int32_t(255)),
+            "1099511627776|   42|7  |005|ff|%");
   // Positional arguments, taken in their own order.
-  FormatMessage(out, u"%2$s has %1$d fields; %2$s", int32_t(4), u"t.dbf");
-  EXPECT_EQ(Text(out), "t.dbf has 4 fields; t.dbf");
-  FormatMessage(out, u"%s and %S", static_cast<const wchar*>(nullptr), static_cast<const char*>(nullptr));
-  EXPECT_EQ(Text(out), "(null) and (null)");
-  FormatMessage(out, u"trailing %");
-  EXPECT_EQ(Text(out), "trailing %");
-  FormatMessage(out, u"\U0001F600");  // a surrogate pair becomes one 4-byte character
-  EXPECT_EQ(Text(out), "\xF0\x9F\x98\x80");
+  EXPECT_EQ(Fmt(u"%2$s has %1$d fields; %2$s", int32_t(4), u"t.dbf"), "t.dbf has 4 fields; t.dbf");
+  EXPECT_EQ(Fmt(u"%s and %S", static_cast<const wchar*>(nullptr), static_cast<const char*>(nullptr)),
+            "(null) and (null)");
+  EXPECT_EQ(Fmt(u"trailing %"), "trailing %");
+  EXPECT_EQ(Fmt(u"\U0001F600"), "\xF0\x9F\x98\x80");  // a surrogate pair becomes one 4-byte character
+}
+
+// The next line of `text` as "keyword=value", or "" when none is left.
+std::string NextLine(ZQString& text) {
+  char keyword[kKeywordSize];
+  if (!NextKeyword(keyword, text)) return "";
+  ZQString value;
+  value.Extract(text);
+  return std::string(keyword) + "=" + Text(value);
 }
 
 TEST(NextKeywordTest, TakesLinesOffAndExtractsTheirValues) {
   ZQString text("version= dBASE IV\r\n\n   \nindex number =  3  \nflag\n");
-  char keyword[kKeywordSize];
-  ZQString value;
-  ASSERT_TRUE(NextKeyword(keyword, text));
-  value.Extract(text);
-  EXPECT_STREQ(keyword, "version");
-  EXPECT_EQ(Text(value), "dBASE IV");
-  ASSERT_TRUE(NextKeyword(keyword, text));  // blank lines are skipped
-  value.Extract(text);
-  EXPECT_STREQ(keyword, "index number");
-  EXPECT_EQ(Text(value), "3");
-  ASSERT_TRUE(NextKeyword(keyword, text));  // a line without '='
-  value.Extract(text);
-  EXPECT_STREQ(keyword, "flag");
-  EXPECT_EQ(Text(value), "");
-  EXPECT_FALSE(NextKeyword(keyword, text));
+  EXPECT_EQ(NextLine(text), "version=dBASE IV");
+  EXPECT_EQ(NextLine(text), "index number=3");  // blank lines are skipped
+  EXPECT_EQ(NextLine(text), "flag=");           // a line without '='
+  EXPECT_EQ(NextLine(text), "");
   EXPECT_EQ(text.length(), 0);
-
   // A keyword longer than the room is cut, not overrun.
   ZQString longer(std::string(200, 'k').append("=v").c_str());
-  ASSERT_TRUE(NextKeyword(keyword, longer));
-  EXPECT_EQ(strlen(keyword), size_t(kKeywordSize - 1));
-  value.Extract(longer);
-  EXPECT_EQ(Text(value), "v");
+  EXPECT_EQ(NextLine(longer), std::string(kKeywordSize - 1, 'k') + "=v");
   ZQString last("version=6");  // no newline at the end
-  ASSERT_TRUE(NextKeyword(keyword, last));
-  value.Extract(last);
-  EXPECT_EQ(Text(value), "6");
-  EXPECT_FALSE(NextKeyword(keyword, last));
+  EXPECT_EQ(NextLine(last), "version=6");
+  EXPECT_EQ(NextLine(last), "");
+}
+
+// sepfile's three parts of `path`, joined by '|'.
+std::string Split(const char* path, bool with_ext = true) {
+  char dir[64], name[64], ext[64] = "";
+  snprintf(dir, sizeof dir, "%s", path);
+  ZQGlob::sepfile(dir, name, with_ext ? ext : nullptr);
+  return std::string(dir) + "|" + name + "|" + ext;
 }
 
 TEST(ZQGlobTest, SplitsAndJoinsPaths) {
-  char path[64] = "/data/dir/table.dbf";
-  char name[64], ext[64];
-  ZQGlob::sepfile(path, name, ext);
-  EXPECT_STREQ(path, "/data/dir/");
-  EXPECT_STREQ(name, "table");
-  EXPECT_STREQ(ext, "dbf");
-  ZQGlob::appndnam(path, name);
+  EXPECT_EQ(Split("/data/dir/table.dbf"), "/data/dir/|table|dbf");
+  EXPECT_EQ(Split("a.b.DBF"), "|a.b|DBF");  // the last point starts the extension
+  EXPECT_EQ(Split("/x.y/table", false), "/x.y/|table|");  // a point in the directory is no extension
+  EXPECT_EQ(Split("dir/.hidden"), "dir/|.hidden|");
+  char path[64] = "/data/dir/";
+  ZQGlob::appndnam(path, "table");
   EXPECT_STREQ(path, "/data/dir/table");
   ZQGlob::appndext(path, "fpt");
   EXPECT_STREQ(path, "/data/dir/table.fpt");
-
-  char plain[64] = "a.b.DBF";  // the last point starts the extension
-  ZQGlob::sepfile(plain, name, ext);
-  EXPECT_STREQ(plain, "");
-  EXPECT_STREQ(name, "a.b");
-  EXPECT_STREQ(ext, "DBF");
-  ZQGlob::appndnam(plain, name);
+  char plain[64] = "";
+  ZQGlob::appndnam(plain, "a.b");
   EXPECT_STREQ(plain, "a.b");
-
-  char dotted_dir[64] = "/x.y/table";  // a point in the directory is no extension
-  ZQGlob::sepfile(dotted_dir, name, nullptr);
-  EXPECT_STREQ(dotted_dir, "/x.y/");
-  EXPECT_STREQ(name, "table");
-
-  char hidden[64] = "dir/.hidden";
-  ZQGlob::sepfile(hidden, name, ext);
-  EXPECT_STREQ(name, ".hidden");
-  EXPECT_STREQ(ext, "");
-
   char nodir[64] = "/tmp";
   ZQGlob::appndnam(nodir, "t");
   EXPECT_STREQ(nodir, "/tmp/t");
@@ -207,9 +191,7 @@ TEST(CodePageTest, ToUtf8AndBack) {
 
 TEST(ZQDateTest, EpochCalendarAndPictures) {
   ZQDateTime t(730122, 1, 0);
-  EXPECT_EQ(t.Year(), 2000);
-  EXPECT_EQ(t.Month(), 1);
-  EXPECT_EQ(t.Day(), 1);
+  EXPECT_EQ(t.Year() * 10000 + t.Month() * 100 + t.Day(), 20000101);
   ZQString iso;
   t.PrintIso(iso);
   EXPECT_EQ(Text(iso), "2000-01-01T00:00:01");
@@ -222,18 +204,15 @@ TEST(ZQDateTest, EpochCalendarAndPictures) {
   EXPECT_EQ(y * 10000 + m * 100 + d, 19700101);
 
   EXPECT_TRUE(IsValidDate(2000, 2, 29));
-  EXPECT_FALSE(IsValidDate(1900, 2, 29));
-  EXPECT_FALSE(IsValidDate(2023, 2, 29));
-  EXPECT_FALSE(IsValidDate(2023, 13, 1));
-  EXPECT_FALSE(IsValidDate(0, 1, 1));
+  for (auto d : {std::array<int32_t, 3>{1900, 2, 29}, {2023, 2, 29}, {2023, 13, 1}, {0, 1, 1}})
+    EXPECT_FALSE(IsValidDate(d[0], d[1], d[2])) << d[0] << "-" << d[1] << "-" << d[2];
 
-  ZQString out;
-  ZQDate(2024, 2, 29).Print(out, "yyyymmdd");
-  EXPECT_EQ(Text(out), "20240229");
-  ZQDate(2024, 2, 9).Print(out, "mm/dd/yy");
-  EXPECT_EQ(Text(out), "02/09/24");
-  ZQDate(2024, 2, 9).Print(out, "yyyy-mm-dd");
-  EXPECT_EQ(Text(out), "2024-02-09");
+  for (auto c : {std::pair<const char*, const char*>{"yyyymmdd", "20240209"}, {"mm/dd/yy", "02/09/24"},
+                 {"yyyy-mm-dd", "2024-02-09"}}) {
+    ZQString out;
+    ZQDate(2024, 2, 9).Print(out, c.first);
+    EXPECT_EQ(Text(out), c.second);
+  }
   ZQDate today;
   EXPECT_TRUE(IsValidDate(today.Year(), today.Month(), today.Day()));
 }

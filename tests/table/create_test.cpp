@@ -99,17 +99,14 @@ TEST(Create, WideHeaderWithMemoFieldsAndProductionFlag) {
   EXPECT_EQ(memo, want_memo);
 
   // Reopened in the same dialect: the same fields, the memo as dBASE IV.
-  ZQDBFIELD* fields[kMaxFields] = {};
-  int v = DIALECT_DBASE4;
-  ZQDBFILE* db = dbopen(nullptr, path.c_str(), fields, &v, false);
-  ASSERT_NE(db, nullptr);
-  EXPECT_EQ(db->fieldcount, 3);
-  EXPECT_STREQ(fields[2]->name, "AMOUNT");
-  EXPECT_EQ(fields[2]->decimals, 2);
-  EXPECT_EQ(fields[1]->length, 10);
-  EXPECT_EQ(db->memokind, MEMO_DB4);
-  EXPECT_EQ(db->memofailed, 0);
-  dbclose(fields, db);
+  tests::OpenedTable t(path, DIALECT_DBASE4);
+  ASSERT_NE(t.db, nullptr);
+  EXPECT_EQ(t.db->fieldcount, 3);
+  EXPECT_STREQ(t.fields[2]->name, "AMOUNT");
+  EXPECT_EQ(t.fields[2]->decimals, 2);
+  EXPECT_EQ(t.fields[1]->length, 10);
+  EXPECT_EQ(t.db->memokind, MEMO_DB4);
+  EXPECT_EQ(t.db->memofailed, 0);
 }
 
 TEST(Create, MemoHeaderOfEachKind) {
@@ -140,17 +137,14 @@ TEST(Create, MemoHeaderOfEachKind) {
     Bytes want = c.head;
     want.resize(512, 0);
     EXPECT_EQ(tests::ReadFile(Sibling(path, c.ext)), want) << c.file;
-    ZQDBFIELD* fields[kMaxFields] = {};
-    int v = c.dialect;
-    ZQDBFILE* db = dbopen(nullptr, path.c_str(), fields, &v, true);
-    ASSERT_NE(db, nullptr) << c.file;
-    EXPECT_EQ(db->memofailed, 0) << c.file;
-    uint32_t at = putmemo(db, 0, ZQString("round trip"));
+    tests::OpenedTable t(path, c.dialect, true);
+    ASSERT_NE(t.db, nullptr) << c.file;
+    EXPECT_EQ(t.db->memofailed, 0) << c.file;
+    uint32_t at = putmemo(t.db, 0, ZQString("round trip"));
     EXPECT_NE(at, 0u) << c.file;
     ZQString text;
-    EXPECT_TRUE(getmemo(db, at, 10, text)) << c.file;
+    EXPECT_TRUE(getmemo(t.db, at, 10, text)) << c.file;
     EXPECT_EQ(std::string(text.c_str()), "round trip") << c.file;
-    dbclose(fields, db);
   }
 }
 
@@ -192,16 +186,13 @@ TEST(Create, NarrowHeaderTakesTheRoomOf32Fields) {
   Bytes memo = {1, 0, 0, 0, 0, 0, 0, 0, 'N', '3', '3', 0, 0, 0, 0, 0, 0, 0, 1, 1, 0, 2};
   memo.resize(512, 0);
   EXPECT_EQ(tests::ReadFile(Sibling(p33, "dbt")), memo);
-  ZQDBFIELD* fields[kMaxFields] = {};
-  int v = DIALECT_ENABLE;
-  ZQDBFILE* db = dbopen(nullptr, p33.c_str(), fields, &v, false);
-  ASSERT_NE(db, nullptr);
-  EXPECT_EQ(db->fieldcount, 33);
-  EXPECT_EQ(db->hdrlen, 537);
-  EXPECT_EQ(db->hasmemo, 1);
-  EXPECT_EQ(db->memokind, MEMO_DB4);
-  EXPECT_EQ(db->memofailed, 0);
-  dbclose(fields, db);
+  tests::OpenedTable t(p33, DIALECT_ENABLE);
+  ASSERT_NE(t.db, nullptr);
+  EXPECT_EQ(t.db->fieldcount, 33);
+  EXPECT_EQ(t.db->hdrlen, 537);
+  EXPECT_EQ(t.db->hasmemo, 1);
+  EXPECT_EQ(t.db->memokind, MEMO_DB4);
+  EXPECT_EQ(t.db->memofailed, 0);
 }
 
 TEST(Create, WideEdgeCases) {
@@ -236,18 +227,10 @@ TEST(Create, WideEdgeCases) {
   // Enable takes it, with a dBASE III memo file.
   path = tests::MemoScratch("d3memo.dbf");
   ASSERT_EQ(dbcreat(path.c_str(), 1, memo.Ptrs(), DIALECT_ENABLE | kMemo, false), 0);
-  ZQDBFIELD* fields[kMaxFields] = {};
-  int v = DIALECT_ENABLE;
-  ZQDBFILE* db = dbopen(nullptr, path.c_str(), fields, &v, true);
-  ASSERT_NE(db, nullptr);
-  EXPECT_EQ(db->memokind, MEMO_DB3);
-  EXPECT_EQ(db->memofailed, 0);
-  dbclose(fields, db);
-}
-
-ZQDBFILE* OpenRw(const std::string& path, int dialect, ZQDBFIELD** fields) {
-  int v = dialect;
-  return dbopen(nullptr, path.c_str(), fields, &v, true);
+  tests::OpenedTable t(path, DIALECT_ENABLE, true);
+  ASSERT_NE(t.db, nullptr);
+  EXPECT_EQ(t.db->memokind, MEMO_DB3);
+  EXPECT_EQ(t.db->memofailed, 0);
 }
 
 // A Visual FoxPro header (date blanked) with its descriptors, the terminator
@@ -344,8 +327,8 @@ TEST(Put, AppendsRewritesAndCloseStampsTheCount) {
   Fields f;
   f.Add("NAME", 'C', 4);
   std::string path = Create("put.dbf", f, DIALECT_DBASE3);
-  ZQDBFIELD* fields[kMaxFields] = {};
-  ZQDBFILE* db = OpenRw(path, DIALECT_DBASE3, fields);
+  tests::OpenedTable t(path, DIALECT_DBASE3, true);
+  ZQDBFILE* db = t.db;
   ASSERT_NE(db, nullptr);
   EXPECT_EQ(dbput(db, "ann ", 0, 1), 0);
   EXPECT_EQ(db->reccount, 1);
@@ -360,7 +343,7 @@ TEST(Put, AppendsRewritesAndCloseStampsTheCount) {
   EXPECT_EQ(dbget(db, 2, buf, &live), 0);  // behind the last record: the end state
   EXPECT_EQ(live, 0);
   EXPECT_EQ(dbput(db, "dee ", 2, 1), 0);   // a write after a read, past that state
-  EXPECT_EQ(dbclose(fields, db), 0);
+  EXPECT_EQ(t.Close(), 0);
   Bytes b = tests::ReadFile(path);
   ASSERT_EQ(b.size(), 66u + 3 * 5 + 1);  // header 32 + 32 + 2
   EXPECT_EQ(GetLe32(&b[4]), 3u);
@@ -372,8 +355,8 @@ TEST(Put, NarrowCountRefusesThe65536thRecord) {
     Fields f;
     f.Add("C", 'C', 1);
     std::string path = Create("narrow" + std::to_string(dialect) + ".dbf", f, dialect);
-    ZQDBFIELD* fields[kMaxFields] = {};
-    ZQDBFILE* db = OpenRw(path, dialect, fields);
+    tests::OpenedTable t(path, dialect, true);
+    ZQDBFILE* db = t.db;
     ASSERT_NE(db, nullptr);
     db->reccount = 65535;  // as if the table were full
     EXPECT_EQ(dbput(db, "x", 65535, 1), -1) << dialect;
@@ -381,7 +364,7 @@ TEST(Put, NarrowCountRefusesThe65536thRecord) {
     EXPECT_EQ(db->changed, 0);
     EXPECT_EQ(dbput(db, "y", 65534, 1), 0) << dialect;  // rewriting the last one still works
     EXPECT_EQ(db->reccount, 65535);
-    EXPECT_EQ(dbclose(fields, db), 0);
+    EXPECT_EQ(t.Close(), 0);
     Bytes b = tests::ReadFile(path);
     EXPECT_EQ(GetLe16(&b[1]), 65535);
     EXPECT_EQ(b.size(), 521u + 65535u * 2 + 1);

@@ -88,21 +88,6 @@ TEST(ReadGetTest, RecordsCutByTheEndOfTheFile) {
   EXPECT_EQ(live, 0);
 }
 
-TEST(ReadGetTest, NarrowTableRecords) {
-  Bytes bytes = DbfBuilder(0x02, true).Field("NAME", 'C', 4).Record({"ann"}).Deleted({"bob"}).Build();
-  Opened t(tests::WriteScratch("get_narrow.dbf", bytes), 0);
-  ASSERT_NE(t.db, nullptr);
-  EXPECT_EQ(t.db->reccount, 2);
-  char buf[4];
-  int live = 0;
-  ASSERT_EQ(dbget(t.db, 1, buf, &live), 0);
-  EXPECT_EQ(std::string(buf, 4), "bob ");
-  EXPECT_EQ(live, 0);
-  ASSERT_EQ(dbget(t.db, 0, buf, &live), 0);
-  EXPECT_EQ(std::string(buf, 4), "ann ");
-  EXPECT_EQ(live, 1);
-}
-
 TEST(ReadGetTest, ClosingAReadTableLeavesItsBytes) {
   // Read everything, run off the end, then close: not one byte changes, and
   // no end mark is added to a table that had none.

@@ -5,6 +5,7 @@
 #include <gtest/gtest.h>
 
 #include <string>
+#include <type_traits>
 #include <vector>
 
 #include "tests/support/todbase_harness.h"
@@ -19,24 +20,16 @@ using tests::Target;
 using tests::Written;
 
 // Writes one value into a new table with a single numeric field and gives the
-// field's bytes. A value given as text takes the field's text path; the
-// double overload the parsed path.
-std::string Number(int dialect, int width, int decimals, const char* text) {
+// field's bytes. A value given as text takes the field's text path; a double
+// the parsed path.
+template <typename V>
+std::string Number(int dialect, int width, int decimals, V value) {
   Target t(dialect);
   t.Add('N', "N", width, decimals);
   std::string path = ScratchPath("num.dbf");
   EXPECT_EQ(t.Open(path), 0);
-  t.Set(0, text);
-  EXPECT_EQ(t.Write(), 0);
-  t.Close();
-  return Written(path).Record(0).substr(1);
-}
-std::string Number(int dialect, int width, int decimals, double value) {
-  Target t(dialect);
-  t.Add('N', "N", width, decimals);
-  std::string path = ScratchPath("num.dbf");
-  EXPECT_EQ(t.Open(path), 0);
-  *t[0] = value;
+  if constexpr (std::is_same_v<V, double>) *t[0] = value;
+  else t.Set(0, value);
   EXPECT_EQ(t.Write(), 0);
   t.Close();
   return Written(path).Record(0).substr(1);
@@ -132,10 +125,8 @@ TEST(ToDbaseEncodeTest, TextStopsAtNulAndOnlyTextTakesTheCodePage) {
   t.Add('N', "QTY", 3);
   std::string path = ScratchPath("cp.dbf");
   ASSERT_EQ(t.Open(path), 0);
-  t.Set(0, "M\xC3\xBCller");       // UTF-8 "Müller": one byte in code page 850
-  t.Set(1, "gr\xC3\xBC\xC3\x9F");  // memo text goes as it is
-  t.Set(2, "12");
-  ASSERT_EQ(t.Write(), 0);
+  // UTF-8 "Müller": one byte in code page 850; memo text goes as it is.
+  ASSERT_EQ(t.Put({"M\xC3\xBCller", "gr\xC3\xBC\xC3\x9F", "12"}), 0);
   t.SetBytes(0, std::string("ab\0cd", 5));  // the copy stops at the NUL byte
   t.Set(1, nullptr);
   t.Set(2, nullptr);
@@ -232,8 +223,7 @@ TEST(ToDbaseEncodeTest, WidthsOutsideOneByteAreRefused) {
   t.Add('C', "MAX", 255);
   std::string path = ScratchPath("wide.dbf");
   ASSERT_EQ(t.Open(path), 0);
-  t.Set(0, std::string(300, 'y').c_str());
-  ASSERT_EQ(t.Write(), 0);
+  ASSERT_EQ(t.Put({std::string(300, 'y').c_str()}), 0);
   t.Close();
   EXPECT_EQ(Written(path).Record(0), " " + std::string(255, 'y'));
 }
@@ -302,8 +292,7 @@ TEST(ToDbaseEncodeTest, LayoutThatDiffersFromTheTable) {
   t.Add('C', "NAME", 10);
   ASSERT_EQ(t.Open(path), 0);
   EXPECT_EQ(t->Position(), 1);
-  t.Set(0, "bob");
-  ASSERT_EQ(t.Write(), 0);
+  ASSERT_EQ(t.Put({"bob"}), 0);
   t.Close();
   Written w(path);
   ASSERT_EQ(w.count, 2);

@@ -61,15 +61,7 @@ TEST(VfpTarget, RecordsInTheFormsTheReadSideDecodes) {
     AddAll(t);
     ASSERT_EQ(t.Open(path), 0);
     // Values as text, the way a CSV file or a text-typed host gives them.
-    t.Set(0, "-7");
-    t.Set(1, "ann");
-    t.Set(2, "a memo");
-    t.Set(3, "2000-01-01T12:00:01");
-    t.Set(4, "1.5");
-    t.Set(5, "1.15");
-    t.Set(6, "20240131");
-    t.Set(7, "T");
-    ASSERT_EQ(t.Write(), 0);
+    ASSERT_EQ(t.Put({"-7", "ann", "a memo", "2000-01-01T12:00:01", "1.5", "1.15", "20240131", "T"}), 0);
     // Values held as numbers and a date-time; a double 0.57 times 10000 is
     // 5699.999... and still stores 5700 ten-thousandths.
     t[0]->SetLong(2147483647);
@@ -82,8 +74,7 @@ TEST(VfpTarget, RecordsInTheFormsTheReadSideDecodes) {
     t.Set(7, "F");
     ASSERT_EQ(t.Write(), 0);
     // No value at all: zeros in the binary forms, blanks in the date.
-    for (int i = 0; i < 8; ++i) t.Set(i, nullptr);
-    ASSERT_EQ(t.Write(), 0);
+    ASSERT_EQ(t.Put({nullptr, nullptr, nullptr, nullptr, nullptr, nullptr, nullptr, nullptr}), 0);
     ASSERT_EQ(t.Close(), 0);
   }
   Bytes b = tests::ReadFile(path);
@@ -151,12 +142,8 @@ TEST(VfpTarget, MemoBlocksKeptOrGivenUpOnRewrite) {
     t.Add('C', "KEY", 2);
     t.Add('M', "NOTE");
     ASSERT_EQ(t.Open(path), 0);
-    t.Set(0, "a");
-    t.Set(1, "first");
-    ASSERT_EQ(t.Write(), 0);
-    t.Set(0, "b");
-    t.Set(1, std::string(100, 'x').c_str());  // blocks 9 and 10
-    ASSERT_EQ(t.Write(), 0);
+    ASSERT_EQ(t.Put({"a", "first"}), 0);
+    ASSERT_EQ(t.Put({"b", std::string(100, 'x').c_str()}), 0);  // blocks 9 and 10
     ASSERT_EQ(t.Close(), 0);
   }
   Bytes before = tests::ReadFile(fpt);
@@ -168,9 +155,7 @@ TEST(VfpTarget, MemoBlocksKeptOrGivenUpOnRewrite) {
     ASSERT_EQ(t.Open(path), 0);
     // The same text again through DeleteRecord: nothing is written.
     ASSERT_EQ(t->DeleteRecord(), 0);
-    t.Set(0, "a");
-    t.Set(1, "first");
-    ASSERT_EQ(t.Write(), 0);
+    ASSERT_EQ(t.Put({"a", "first"}), 0);
     // A text that fits the old blocks stays there; a blank one gives them up.
     ZQRecord& r = t.Layout();
     t->SetFilePosition(1);
@@ -201,14 +186,8 @@ TEST(VfpTarget, TablesOfOtherWriters) {
   tests::WriteAt(path.substr(0, path.size() - 3) + "fpt", fpt);
   Bytes rec = {' '};
   for (char c : Le32(41) + "z " + Le32(4) + Le64(0) + std::string(1, '\0')) rec.push_back(uint8_t(c));
-  tests::WriteAt(path, DbfBuilder(0x30)
-                           .Field("N", 'I', 4)
-                           .Field("KEY", 'C', 2)
-                           .Field("NOTE", 'M', 4)
-                           .Field("PRICE", 'Y', 8, 4)
-                           .Field("_NullFlags", '0', 1)
-                           .HeaderExtra(263)
-                           .RawRecord(rec)
+  tests::WriteAt(path, DbfBuilder(0x30).Field("N", 'I', 4).Field("KEY", 'C', 2).Field("NOTE", 'M', 4)
+                           .Field("PRICE", 'Y', 8, 4).Field("_NullFlags", '0', 1).HeaderExtra(263).RawRecord(rec)
                            .Build());
   {
     Target t(10, 1);
@@ -217,11 +196,7 @@ TEST(VfpTarget, TablesOfOtherWriters) {
     t.Add('M', "NOTE");
     t.Add('Y', "PRICE", 8, 4);
     ASSERT_EQ(t.Open(path), 0);
-    t.Set(0, "42");
-    t.Set(1, "y");
-    t.Set(2, "new");
-    t.Set(3, "-2.5");
-    ASSERT_EQ(t.Write(), 0);
+    ASSERT_EQ(t.Put({"42", "y", "new", "-2.5"}), 0);
     ASSERT_EQ(t.Close(), 0);
   }
   Bytes b = tests::ReadFile(path);

@@ -116,6 +116,68 @@ def same_value(letter, zq, ref):
     return zq == ref
 
 
+# --- tables written from CSV, read back by every reader ----------------------
+
+def write_csv(path, names, rows):
+    """Writes `rows` (tuples in the order of `names`) as CSV with a header:
+    booleans as true/false, dates and date-times in ISO form, None empty."""
+    def cell(v):
+        if v is None:
+            return ""
+        if isinstance(v, bool):
+            return "true" if v else "false"
+        t = v.isoformat() if isinstance(v, (datetime.date, datetime.datetime)) else \
+            format(v, "f") if isinstance(v, decimal.Decimal) else str(v)
+        return '"' + t.replace('"', '""') + '"' if any(c in t for c in ',"\r\n') else t
+    with open(path, "w", encoding="utf-8", newline="") as f:
+        f.write("\r\n".join([",".join(names)] + [",".join(cell(v) for v in r) for r in rows]) + "\r\n")
+
+
+def same_written(want, got):
+    """A value as written against one read back by any reader: blank text, a
+    blank memo and no value are one; numbers by value; dates and date-times
+    as objects or as zqdb's ISO text."""
+    if want in (None, "") or got in (None, ""):
+        return want in (None, "") and got in (None, "")
+    if isinstance(want, bool) or isinstance(got, bool):
+        return want is got
+    if isinstance(want, (int, float, decimal.Decimal)):
+        return isinstance(got, (int, float, decimal.Decimal)) and \
+            abs(decimal.Decimal(str(got)) - decimal.Decimal(str(want))) <= abs(decimal.Decimal(str(want))) * decimal.Decimal("1e-12")
+    if isinstance(want, (datetime.date, datetime.datetime)):
+        return got == want or got == want.isoformat()
+    return got == want
+
+
+def compare_rows(s, label, names, want_rows, got_rows, skip=()):
+    """`got_rows` (dicts by field name) hold `want_rows` (tuples in the order
+    of `names`), field for field but those in `skip`."""
+    s.check(label + " record count", len(got_rows) == len(want_rows), "%d, expected %d" % (len(got_rows), len(want_rows)))
+    bad = ["record %d %s: %r, expected %r" % (i, k, g.get(k), v)
+           for i, (w, g) in enumerate(zip(want_rows, got_rows)) for k, v in zip(names, w)
+           if k not in skip and not same_written(v, g.get(k))]
+    s.check(label + " values", not bad, "; ".join(bad[:4]))
+
+
+def pydbf_rows(path, codepage="cp1252"):
+    """The records as python3-dbf reads them, names upper-cased, text without
+    trailing blanks; a memo up to its first 0x1A (python3-dbf reads a dBASE
+    III memo on to a pair of them), ten digits 0 (on which it fails) as None."""
+    import dbf
+    with dbf.Table(path, codepage=codepage) as t:
+        rows = []
+        for rec in t:
+            row = {}
+            for name in t.field_names:
+                try:
+                    v = rec[name]
+                except TypeError:
+                    v = None
+                row[name.upper()] = v.split("\x1a")[0].rstrip(" ") if isinstance(v, str) else v
+            rows.append(row)
+        return rows
+
+
 class Suite:
     """A group of named checks; prints one line per failure and a summary."""
 

@@ -22,7 +22,8 @@ import struct
 import sys
 
 sys.path.insert(0, os.path.dirname(os.path.abspath(__file__)))
-from common import Suite, run, same_value, workdir, zqdb_fields, zqdb_rows, ZQDB  # noqa: E402
+from common import (Suite, compare_rows, pydbf_rows, run, same_value, workdir, write_csv, zqdb_fields,  # noqa: E402
+                    zqdb_rows, ZQDB)
 
 import dbf  # noqa: E402
 import dbfread  # noqa: E402
@@ -47,53 +48,8 @@ VFP_FIELDS = [("ID", "I", 4, 0), ("NAME", "C", 20, 0), ("NOTE", "M", 4, 0), ("PR
               ("AMT", "N", 10, 2)]
 
 
-def cell(v):
-    if v is None:
-        return ""
-    if isinstance(v, bool):
-        return "true" if v else "false"
-    s = v.isoformat() if isinstance(v, (D, DT)) else format(v, "f") if isinstance(v, Dec) else str(v)
-    return '"' + s.replace('"', '""') + '"' if any(c in s for c in ',"\r\n') else s
-
-
-def write_csv(path, names, rows):
-    with open(path, "w", encoding="utf-8", newline="") as f:
-        f.write("\r\n".join([",".join(names)] + [",".join(cell(v) for v in r) for r in rows]) + "\r\n")
-
-
-def same(want, got):
-    """A value as written against one read back by any of the three readers:
-    blank text, a blank memo and no value are one; numbers by value; dates and
-    date-times as objects or as zqdb's ISO text."""
-    if want in (None, "") or got in (None, ""):
-        return want in (None, "") and got in (None, "")
-    if isinstance(want, bool) or isinstance(got, bool):
-        return want is got
-    if isinstance(want, (int, float, Dec)):
-        return isinstance(got, (int, float, Dec)) and abs(Dec(str(got)) - Dec(str(want))) <= abs(Dec(str(want))) * Dec("1e-12")
-    if isinstance(want, (D, DT)):
-        return got == want or got == want.isoformat()
-    return got == want
-
-
-def compare(s, label, names, want_rows, got_rows):
-    s.check(label + " record count", len(got_rows) == len(want_rows), "%d, expected %d" % (len(got_rows), len(want_rows)))
-    bad = []
-    for i, (w, g) in enumerate(zip(want_rows, got_rows)):
-        for k, v in zip(names, w):
-            if not same(v, g.get(k)):
-                bad.append("record %d %s: %r, expected %r" % (i, k, g.get(k), v))
-    s.check(label + " values", not bad, "; ".join(bad[:4]))
-
-
 def dbfread_rows(path):
     return [dict(r) for r in dbfread.DBF(path, encoding="cp1252", char_decode_errors="strict")]
-
-
-def pydbf_rows(path):
-    with dbf.Table(path, codepage="cp1252") as t:
-        return [{name.upper(): (v.rstrip(" ") if isinstance(v, str) else v) for name, v in zip(t.field_names, rec)}
-                for rec in t]
 
 
 def all_readers(s, label, path, names, want, fields=None):
@@ -105,10 +61,10 @@ def all_readers(s, label, path, names, want, fields=None):
     rf = [(f.name, f.type, f.length, f.decimal_count) for f in dbfread.DBF(path, encoding="cp1252").fields]
     s.check(label + " fields", zf == rf and (fields is None or zf == fields), "zqdb %s, dbfread %s" % (zf, rf))
     zrows = zqdb_rows(path, *CP)
-    compare(s, label + " zqdb", names, want, zrows)
+    compare_rows(s, label + " zqdb", names, want, zrows)
     rrows = dbfread_rows(path)
-    compare(s, label + " dbfread", names, want, rrows)
-    compare(s, label + " python3-dbf", names, want, pydbf_rows(path))
+    compare_rows(s, label + " dbfread", names, want, rrows)
+    compare_rows(s, label + " python3-dbf", names, want, pydbf_rows(path))
     letters = {f[0]: f[1] for f in rf}
     bad = ["record %d %s: zqdb %r, dbfread %r" % (i, k, z[k], r[k])
            for i, (z, r) in enumerate(zip(zrows, rrows)) for k in r if not same_value(letters[k], z[k], r[k])]

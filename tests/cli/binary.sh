@@ -3,12 +3,8 @@
 # no text (G fields, memos holding NULs) come out of CSV and JSON as base64,
 # with one warning.
 source "$(dirname "$0")/lib.bash" "$1"
-case $ZQDB in /*) ;; *) ZQDB=$PWD/$ZQDB ;; esac
 cd "$WORK" || exit 1
 
-same() {  # same WHAT GOT WANT
-  if [ "$2" = "$3" ]; then PASSED=$((PASSED + 1)); else fail "$1: got '$2', expected '$3'"; fi
-}
 patch() { printf "$3" | dd of="$1" bs=1 seek="$2" conv=notrunc 2>/dev/null; }
 
 # NAME C(10) of record 1 "alice" and five NULs; record 2 made live, its NAME

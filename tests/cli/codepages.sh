@@ -3,17 +3,10 @@
 # .cpg file beside the tables written, and characters the code page can't
 # hold warned of (or refused under --strict).
 source "$(dirname "$0")/lib.bash" "$1"
-case $ZQDB in /*) ;; *) ZQDB=$PWD/$ZQDB ;; esac
 cd "$WORK" || exit 1
 
-err_has() {
-  if grep -qF -- "$1" "$ERR"; then PASSED=$((PASSED + 1)); else fail "stderr lacks '$1': $(head -c 400 "$ERR")"; fi
-}
 # hex FILE OFFSET COUNT: the bytes as plain hex
 hex() { od -An -tx1 -j "$2" -N "$3" "$1" | tr -d ' \n'; }
-same() {  # same WHAT GOT WANT
-  if [ "$2" = "$3" ]; then PASSED=$((PASSED + 1)); else fail "$1: got '$2', expected '$3'"; fi
-}
 set_driver() { printf "\x$2" | dd of="$1" bs=1 seek=29 conv=notrunc 2>/dev/null; }
 
 # A dBASE III table, NAME C(10), "M\x81ller" (Müller in code page 850).

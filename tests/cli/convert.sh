@@ -3,17 +3,6 @@
 # and update keep the table's own layout.
 source "$(dirname "$0")/lib.bash" "$1"
 
-# err_has TEXT: a line of the last run's stderr holds TEXT.
-err_has() {
-  if grep -qF -- "$1" "$ERR"; then PASSED=$((PASSED + 1)); else fail "stderr lacks '$1': $(head -c 400 "$ERR")"; fi
-}
-# absent PATH...: none of the files exists.
-absent() {
-  local p
-  for p in "$@"; do
-    if [ -e "$p" ]; then fail "$p was left behind"; else PASSED=$((PASSED + 1)); fi
-  done
-}
 # same_sum FILE SUM: FILE's checksum is still SUM.
 same_sum() {
   if [ "$(cksum <"$1" 2>/dev/null)" = "$2" ]; then PASSED=$((PASSED + 1)); else fail "$1 changed"; fi
@@ -26,7 +15,6 @@ cat_is() {
   else fail "cat $1:"; diff "$WORK/want" "$WORK/got" | head -10; head -3 "$WORK/cat_err"; fi
 }
 
-case $ZQDB in /*) ;; *) ZQDB=$PWD/$ZQDB ;; esac
 cd "$WORK" || exit 1
 
 # --- Bad input ---------------------------------------------------------------

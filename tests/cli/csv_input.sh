@@ -3,12 +3,8 @@
 # when the header has no comma, --delimiter and --csv-codepage say what the
 # file is; text up to 255 bytes stays C.
 source "$(dirname "$0")/lib.bash" "$1"
-case $ZQDB in /*) ;; *) ZQDB=$PWD/$ZQDB ;; esac
 cd "$WORK" || exit 1
 
-same() {  # same WHAT GOT WANT
-  if [ "$2" = "$3" ]; then PASSED=$((PASSED + 1)); else fail "$1: got '$2', expected '$3'"; fi
-}
 # fields_of TABLE: the "name type width" lines of info
 fields_of() { "$ZQDB" info "$1" | sed -n 's/^  [0-9]* *\([A-Z_0-9]*\) *\([A-Z]\) *\([0-9]*\) .*/\1 \2 \3/p' | tr '\n' ' '; }
 

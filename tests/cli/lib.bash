@@ -1,9 +1,11 @@
 # Shared helpers of the CLI tests (sourced, not run by itself).
 #   source "$(dirname "$0")/lib.bash" "$1"
-# sets ZQDB and WORK (a temporary directory removed on exit), and gives
-# expect_run, expect_out, expect_err, make_table and finish.
+# sets ZQDB (an absolute path) and WORK (a temporary directory removed on
+# exit), and gives expect_run, expect_out, expect_err, err_has, same,
+# same_file, absent, make_table and finish.
 
 ZQDB=${1:?usage: bash test.sh PATH_TO_ZQDB}
+case $ZQDB in /*) ;; *) ZQDB=$PWD/$ZQDB ;; esac
 WORK=$(mktemp -d "${TMPDIR:-/tmp}/zqdb-cli-XXXXXX")
 trap 'rm -rf "$WORK"' EXIT
 PASSED=0
@@ -31,6 +33,26 @@ expect_out() {
 # expect_err TEXT: the last run's stderr holds TEXT as its first line's start.
 expect_err() {
   if head -n 1 "$ERR" | grep -qF -- "$1"; then PASSED=$((PASSED + 1)); else fail "stderr lacks '$1': $(head -c 300 "$ERR")"; fi
+}
+
+# err_has TEXT: a line of the last run's stderr holds TEXT.
+err_has() {
+  if grep -qF -- "$1" "$ERR"; then PASSED=$((PASSED + 1)); else fail "stderr lacks '$1': $(head -c 400 "$ERR")"; fi
+}
+# same WHAT GOT WANT: two texts are equal.
+same() {
+  if [ "$2" = "$3" ]; then PASSED=$((PASSED + 1)); else fail "$1: got '$2', expected '$3'"; fi
+}
+# same_file FILE COPY: FILE holds the bytes of COPY.
+same_file() {
+  if cmp -s "$1" "$2"; then PASSED=$((PASSED + 1)); else fail "$1 differs from $2"; fi
+}
+# absent PATH...: none of the files exists.
+absent() {
+  local p
+  for p in "$@"; do
+    if [ -e "$p" ]; then fail "$p was left behind"; else PASSED=$((PASSED + 1)); fi
+  done
 }
 
 # make_table PATH [VERSION_BYTE_HEX]: a dBASE III table (version 03 unless

@@ -2,13 +2,8 @@
 # field and value named, before anything is written; currency is carried
 # exactly, whatever its size.
 source "$(dirname "$0")/lib.bash" "$1"
-case $ZQDB in /*) ;; *) ZQDB=$PWD/$ZQDB ;; esac
 cd "$WORK" || exit 1
 
-err_has() {
-  if grep -qF -- "$1" "$ERR"; then PASSED=$((PASSED + 1)); else fail "stderr lacks '$1': $(head -c 400 "$ERR")"; fi
-}
-absent() { if [ -e "$1" ]; then fail "$1 was left behind"; else PASSED=$((PASSED + 1)); fi; }
 
 # value, schema, target dialect, the error's end ("" = it fits); each a line
 while IFS='|' read -r value schema to want; do

@@ -5,21 +5,7 @@
 source "$(dirname "$0")/lib.bash" "$1"
 REGRESS=$(cd "$(dirname "$0")/../regress" && pwd)
 
-err_has() {
-  if grep -qF -- "$1" "$ERR"; then PASSED=$((PASSED + 1)); else fail "stderr lacks '$1': $(head -c 400 "$ERR")"; fi
-}
-# same FILE COPY: FILE holds the bytes of COPY.
-same() {
-  if cmp -s "$1" "$2"; then PASSED=$((PASSED + 1)); else fail "$1 differs from $2"; fi
-}
-absent() {
-  local p
-  for p in "$@"; do
-    if [ -e "$p" ]; then fail "$p was left behind"; else PASSED=$((PASSED + 1)); fi
-  done
-}
 
-case $ZQDB in /*) ;; *) ZQDB=$PWD/$ZQDB ;; esac
 cd "$WORK" || exit 1
 make_table src.dbf
 
@@ -35,7 +21,7 @@ for t in "t0:The header gives a record length of 0" "short:Field 0 extends beyon
   for mode in "append" "update --key NAME"; do
     # shellcheck disable=SC2086
     expect_run 1 convert src.dbf $t.dbf --mode $mode && expect_err "zqdb: $message"
-    same $t.dbf $t.before
+    same_file $t.dbf $t.before
   done
 done
 
@@ -70,14 +56,14 @@ for at in 200 $HALF; do
   cp base.dbf t.dbf
   kill_when "[ \$(size t.dbf) -gt $at ]" convert big.dbf t.dbf --mode append
   expect_run 0 convert two.csv t.dbf --mode append
-  same t.dbf clean.dbf
+  same_file t.dbf clean.dbf
 done
 # A killed replace leaves the old table as it was and its scratch directory,
 # named by its process id; the next run into that directory removes it.
 for at in 0 $HALF; do
   cp base.dbf r.dbf
   kill_when "[ \$(size .zqdb-*/r.dbf) -gt $at ]" convert big.dbf r.dbf
-  same r.dbf base.dbf
+  same_file r.dbf base.dbf
   ls -d .zqdb-[0-9]*-* >/dev/null 2>&1 && PASSED=$((PASSED + 1)) || fail "no scratch directory of the killed run"
   expect_run 0 convert two.csv other.dbf
   absent .zqdb-*
@@ -89,7 +75,7 @@ seq 0 $ROWS | awk 'BEGIN { print "NAME,QTY" } { print "n" $1 "," ($1 + 7) % 9999
 cp big.dbf u.dbf
 kill_when "[ \$(size .zqdb-*-journal-u.dbf) -gt 100000 ]" convert changed.csv u.dbf --mode update --key NAME
 expect_run 0 info u.dbf && err_has "zqdb: warning: u.dbf was restored to what it was before a run that was interrupted"
-same u.dbf big.dbf
+same_file u.dbf big.dbf
 absent .zqdb-*
 
 # A killed run into a new SQLite database leaves nothing under its name (the
@@ -114,19 +100,19 @@ exec 9<l.dbf
 flock -x 9
 expect_run 1 convert two.csv l.dbf --mode append && expect_err "zqdb: l.dbf is in use by another program (--wait waits for it)"
 expect_run 1 cat l.dbf && expect_err "zqdb: l.dbf is being written by another program (--wait waits for it)"
-same l.dbf l.before
+same_file l.dbf l.before
 flock -s 9  # a reader: other readers go on, writers don't
 expect_run 0 cat l.dbf
 expect_run 1 convert two.csv l.dbf --mode update --key NAME && expect_err "zqdb: l.dbf is in use by another program"
-same l.dbf l.before
+same_file l.dbf l.before
 # --wait: the append waits for the lock and then runs.
 "$ZQDB" convert two.csv l.dbf --mode append --wait >/dev/null 2>&1 &
 waiter=$!
 sleep 0.2
-same l.dbf l.before
+same_file l.dbf l.before
 flock -u 9
 wait $waiter && PASSED=$((PASSED + 1)) || fail "the waiting append failed"
-same l.dbf clean.dbf
+same_file l.dbf clean.dbf
 exec 9<&-
 # Two appends of all the records at once, both waiting: none is lost.
 cp base.dbf l.dbf
@@ -162,7 +148,7 @@ if [ "$(id -u)" = 0 ] && mkdir full && mount -t tmpfs -o size=1m tmpfs full 2>/d
     expect_run 1 convert memos.csv full/f.dbf --mode $mode &&
       expect_err "zqdb: cannot write full/f." && err_has ": No space left on device (the table was left as it was before the run)"
     grep -Eq "cannot write full/f\.(dbf|dbt|mdx):" "$ERR" && PASSED=$((PASSED + 1)) || fail "the file that filled the disk is not named"
-    for f in f.dbf f.dbt f.mdx; do same full/$f $f.before; done
+    for f in f.dbf f.dbt f.mdx; do same_file full/$f $f.before; done
     absent full/.zqdb-*
   done
 else
@@ -183,8 +169,8 @@ done
 expect_run 1 convert memo.csv memo.csv && expect_err "zqdb: the target memo.csv would write over memo.csv, the source; choose another name"
 expect_run 1 convert m.dbf m.DBT && expect_err "zqdb: the target m.DBT would write over m.dbt, the source's memo file; choose another name"
 expect_run 1 convert m.dbf o.dbf --index m.dbt=NAME && err_has "would write over m.dbt"
-same m.dbf m.dbf.before
-same m.dbt m.dbt.before
+same_file m.dbf m.dbf.before
+same_file m.dbt m.dbt.before
 absent m.DBT o.dbf
 
 # --- Moving into place, permissions -----------------------------------------------
@@ -192,7 +178,7 @@ absent m.DBT o.dbf
 printf 'NAME\nold\n' >old.csv && "$ZQDB" convert old.csv d.dbf 2>/dev/null && cp d.dbf d.before
 mkdir d.dbt
 expect_run 1 convert memo.csv d.dbf --schema "NAME C(10), NOTE M" && expect_err "zqdb: cannot replace ./d.dbt: it is a directory"
-same d.dbf d.before
+same_file d.dbf d.before
 [ -d d.dbt ] && [ -z "$(ls -A d.dbt)" ] && PASSED=$((PASSED + 1)) || fail "d.dbt is no longer an empty directory"
 absent .zqdb-*
 # A replaced table keeps its mode; one the user may not write is refused in
@@ -207,7 +193,7 @@ for mode in replace append; do
   $as_user "$ZQDB" convert shared/memo.csv shared/m.dbf --mode $mode >"$OUT" 2>"$ERR"
   [ $? -eq 1 ] && PASSED=$((PASSED + 1)) || fail "a read-only table was written in $mode mode"
   expect_err "zqdb: cannot write shared/m.dbf: Permission denied"
-  same shared/m.dbf ro.before
+  same_file shared/m.dbf ro.before
 done
 # Index files the user may only read are still checked, walked and sought.
 "$ZQDB" convert memo.csv shared/i.dbf --schema "NAME C(10), NOTE M" --index NAME=NAME --index shared/i.ndx=NAME 2>/dev/null

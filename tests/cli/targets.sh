@@ -2,12 +2,8 @@
 # through and stays a link, a device, FIFO or directory takes no table, and a
 # name of a format zqdb doesn't write is a usage error.
 source "$(dirname "$0")/lib.bash" "$1"
-case $ZQDB in /*) ;; *) ZQDB=$PWD/$ZQDB ;; esac
 cd "$WORK" || exit 1
 
-same() {  # same WHAT GOT WANT
-  if [ "$2" = "$3" ]; then PASSED=$((PASSED + 1)); else fail "$1: got '$2', expected '$3'"; fi
-}
 
 make_table t.dbf
 expect_run 0 convert t.dbf -

@@ -3,7 +3,6 @@
 # dialect named by the user reads what it reads, and a warning counts the
 # rest.
 source "$(dirname "$0")/lib.bash" "$1"
-case $ZQDB in /*) ;; *) ZQDB=$PWD/$ZQDB ;; esac
 cd "$WORK" || exit 1
 
 # wide_table PATH N: a 0x03 table of N fields F1..FN, C(1), one record whose

@@ -74,36 +74,26 @@ expect_err "zqdb: record 2, field NAME: \"bernadette-marie\" would be cut to 5 b
 [ ! -e cut.dbf ] && PASSED=$((PASSED + 1)) || fail "--strict kept cut.dbf"
 
 # --- info --format json -------------------------------------------------------
+# json_holds WHAT EXPR: EXPR, a Python expression over the last run's JSON `d`, holds.
+json_holds() {
+  /usr/bin/python3 -c 'import json, sys; d = json.load(open(sys.argv[1])); sys.exit(0 if eval("(" + sys.argv[2] + ")") else "%r" % d)' \
+    "$OUT" "$2" && PASSED=$((PASSED + 1)) || fail "$1"
+}
 expect_run 0 info t.dbf --format json
-/usr/bin/python3 - "$OUT" <<'X' || fail "info json"
-import json, sys
-d = json.load(open(sys.argv[1]))
-want = {"dialect": 2, "dialect_name": "dBASE IV", "version_byte": 3, "codepage_byte": 0, "production_index": False,
-        "records_in_header": 2, "records_live": 1, "header_length": 97, "record_length": 16, "memo": None,
-        "fields": [{"name": "NAME", "type": "C", "width": 10, "decimals": 0},
-                   {"name": "QTY", "type": "N", "width": 5, "decimals": 0}], "indexes": []}
-bad = {k: (d.get(k), v) for k, v in want.items() if d.get(k) != v}
-sys.exit("differs: %r" % bad if bad else 0)
-X
+json_holds "info json" 'd == dict(d, dialect=2, dialect_name="dBASE IV", version_byte=3, codepage_byte=0,
+  production_index=False, records_in_header=2, records_live=1, header_length=97, record_length=16, memo=None,
+  fields=[{"name": "NAME", "type": "C", "width": 10, "decimals": 0},
+          {"name": "QTY", "type": "N", "width": 5, "decimals": 0}], indexes=[])'
 expect_run 0 convert t.dbf ix.dbf --index BYNAME=NAME --to 2
 expect_run 0 info ix.dbf --format json
-/usr/bin/python3 -c "
-import json, sys
-d = json.load(open('$OUT'))
-i = d['indexes'][0]
-assert (i['name'], i['expression'], i['unique']) == ('BYNAME', 'NAME', False), i
-assert i['file'].lower().endswith('ix.mdx') and d['production_index'] is True, d" || fail "info json indexes"
+json_holds "info json indexes" '[d["indexes"][0][k] for k in ("name", "expression", "unique")] == ["BYNAME", "NAME", False]
+  and d["indexes"][0]["file"].lower().endswith("ix.mdx") and d["production_index"] is True'
 printf 'NAME,NOTE\nann,hello\n' >notes.csv
 expect_run 0 convert notes.csv memo4.dbf --schema "NOTE M" && expect_run 0 info memo4.dbf --format json
-/usr/bin/python3 -c "
-import json
-m = json.load(open('$OUT'))['memo']
-assert m['file'].endswith('memo4.dbt') and m['kind'] == 'dBASE IV' and m['block_size'] == 512, m" || fail "info json memo"
+json_holds "info json memo" 'd["memo"]["file"].endswith("memo4.dbt") and d["memo"]["kind"] == "dBASE IV"
+  and d["memo"]["block_size"] == 512'
 expect_run 1 info short.dbf --format json
-/usr/bin/python3 -c "
-import json
-d = json.load(open('$OUT'))
-assert d['records_in_header'] == 2 and 'cut short' in d['error'], d" || fail "info json of a damaged table"
+json_holds "info json of a damaged table" 'd["records_in_header"] == 2 and "cut short" in d["error"]'
 
 # --- --fields -----------------------------------------------------------------
 expect_run 0 cat t.dbf --fields qty,NAME && expect_out "QTY,NAME" && expect_out "42,alice"

@@ -31,6 +31,13 @@ def run(cmd, **kw):
     return p.returncode, p.stdout.decode("utf-8", "replace"), p.stderr.decode("utf-8", "replace")
 
 
+def must(cmd):
+    """Runs another program's command; raises with its error when it fails."""
+    rc, _, err = run(cmd)
+    if rc != 0:
+        raise AssertionError("%s: exit %d: %s" % (cmd[0], rc, err.strip()))
+
+
 def zqdb_rows(table, *opts):
     """The live records as zqdb prints them in JSON lines, numbers as Decimal."""
     rc, out, err = run([ZQDB, "cat", table, "--format", "jsonl", *opts])

@@ -7,17 +7,11 @@ import os
 import sys
 
 sys.path.insert(0, os.path.dirname(os.path.abspath(__file__)))
-from common import Suite, run, workdir  # noqa: E402
+from common import Suite, must, workdir  # noqa: E402
 
 import dbf  # noqa: E402
 
 s = Suite("blank_values")
-
-
-def must(cmd):
-    rc, out, err = run(cmd)
-    if rc != 0:
-        raise AssertionError("%s: exit %d: %s" % (cmd[0], rc, err.strip()))
 
 
 with workdir() as d:

@@ -58,16 +58,9 @@ TEST(Trailer, BuiltModuleEndsWithTheNineDefinitions) {
   for (int i = 0; i < 9; ++i) {
     const Expected& e = kExpected[i];
     const uint8_t* start = p;
-    uint32_t words[8];
+    std::vector<uint32_t> words(8);
     for (uint32_t& w : words) w = GetBe32(p), p += 4;
-    EXPECT_EQ(words[0], 1u);
-    EXPECT_EQ(words[1], e.number);
-    EXPECT_EQ(words[2], 4u);
-    EXPECT_EQ(words[3], 6u);
-    EXPECT_EQ(words[4], 0u);
-    EXPECT_EQ(words[5], 900u);
-    EXPECT_EQ(words[6], 0u);
-    EXPECT_EQ(words[7], 0u);
+    EXPECT_EQ(words, (std::vector<uint32_t>{1, e.number, 4, 6, 0, 900, 0, 0})) << e.key;
     EXPECT_EQ(Cstr(p), e.key);
     EXPECT_EQ(Cstr(p), e.display);
     uint64_t flags = GetBe64(p);
@@ -81,9 +74,7 @@ TEST(Trailer, BuiltModuleEndsWithTheNineDefinitions) {
     EXPECT_EQ(Cstr(p), e.short_name);
     EXPECT_EQ(Cstr(p), "dbse");
     EXPECT_EQ(Cstr(p), "Dbase");
-    EXPECT_EQ(GetBe32(p), 4u);
-    EXPECT_EQ(GetBe32(p + 4), 1u);
-    EXPECT_EQ(GetBe32(p + 8), 0u);
+    EXPECT_EQ(std::vector<uint32_t>({GetBe32(p), GetBe32(p + 4), GetBe32(p + 8)}), (std::vector<uint32_t>{4, 1, 0}));
     p += 12;
     EXPECT_EQ(Cstr(p), "FlatFile");
     EXPECT_EQ(GetBe32(p), 0u);

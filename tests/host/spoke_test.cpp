@@ -111,10 +111,6 @@ TEST(ZQFieldTest, RenderFlagsDatesAndNumbers) {
   EXPECT_EQ(Text(out), "01/01/00");
   d.RenderText(out, 0);
   EXPECT_EQ(Text(out), "20000101");
-  d = ZQString("00000000");  // zeros and blanks: no date
-  EXPECT_TRUE(d.IsBlank());
-  d = ZQString("2000013x");  // not a date: kept as it stands
-  EXPECT_EQ(Text(d.StringRef()), "2000013x");
 
   ZQField l(Defined("Boolean;usage=0x4c;picture=T.F"), "OK");
   EXPECT_EQ(l.DisplayLength(), 1);

@@ -5,7 +5,7 @@
 
 #include <string>
 
-#include "support/todbase_harness.h"
+#include "tests/support/todbase_harness.h"
 #include "host/platform.h"
 #include "index/mdx.h"
 

@@ -10,7 +10,7 @@
 #include <string>
 #include <vector>
 
-#include "connector/todbase_harness.h"
+#include "tests/support/todbase_harness.h"
 #include "host/endian.h"
 #include "host/platform.h"
 #include "index/foxidx.h"

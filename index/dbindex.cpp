@@ -223,7 +223,9 @@ int32_t ZQDBIndexBase::KeyFormLength(const ZQIndexDef* def) {
 }
 
 void ZQDBIndexBase::BuildKey(ZQString& key, const ZQIndexDef* def) {
-  static thread_local ZQString scratch;
+  // The module runs on one thread at a time; a plain static keeps the
+  // loaded module free of thread-local storage.
+  static ZQString scratch;
   ZQDType number(DT_DOUBLE);
   number.MSBFirst(false);
   key = "";

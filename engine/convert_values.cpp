@@ -133,10 +133,7 @@ static bool KeepsText(const ZQField* dst, const ZQField* src) {
     case FT_NUMERIC:
     case FT_INTEGER:
     case FT_FLOAT:
-    case FT_CURRENCY: {
-      FIELDTYPE t = src->FieldType();
-      return t == FT_NUMERIC || t == FT_INTEGER || t == FT_FLOAT || t == FT_CURRENCY;
-    }
+    case FT_CURRENCY: return IsNumericType(src->FieldType());
     default: return true;
   }
 }
@@ -146,8 +143,7 @@ bool CopyValue(ZQField* dst, ZQField* src, FieldCheck* check, bool move) {
     case ZQField::Held::kText: {
       FIELDTYPE t = dst->FieldType();
       const ZQString& s = src->StringRef();
-      bool numeric = t == FT_NUMERIC || t == FT_INTEGER || t == FT_FLOAT || t == FT_CURRENCY;
-      if (numeric && !IsNumberText(s)) return false;
+      if (IsNumericType(t) && !IsNumberText(s)) return false;
       if (t == FT_BOOLEAN && !IsLogicalText(s)) return false;
       if (t == FT_DATE) {
         dst->AssignText(s.c_str(), s.length());

@@ -7,6 +7,11 @@
 
 #include "host/zqfield.h"
 
+// The field types that hold numbers (N, I, F, Y).
+inline bool IsNumericType(FIELDTYPE t) {
+  return t == FT_NUMERIC || t == FT_INTEGER || t == FT_FLOAT || t == FT_CURRENCY;
+}
+
 // Per target field: how many values did not fit and were cut.
 struct FieldCheck {
   char letter;

@@ -6,6 +6,8 @@
 #include <cstdint>
 #include <cstring>
 
+#include "host/zqdate.h"
+
 class OutBuf {
  public:
   static constexpr size_t kSize = 1 << 20;
@@ -42,6 +44,11 @@ class OutBuf {
   void PutDouble(double v);
   // "YYYY-MM-DD"
   void PutDate(int32_t y, int32_t m, int32_t d);
+  // "YYYY-MM-DDTHH:MM:SS"
+  void PutDateTime(const ZQDateTime& dt) {
+    char* p = Reserve(ZQDateTime::kIsoSize);
+    Commit(size_t(dt.PrintIso(p, ZQDateTime::kIsoSize)));
+  }
   bool Flush();
   bool failed() const { return failed_; }
   // Why the write failed: an errno value, 0 when it didn't.

@@ -11,6 +11,7 @@
 #include <cstring>
 #include <string>
 
+#include "engine/convert_values.h"
 #include "engine/text_util.h"
 #include "host/bytescan.h"
 #include "engine/writers.h"
@@ -82,7 +83,7 @@ class PgsqlWriter : public RecordWriter {
         case ZQField::Held::kBlank: out_.Put("\\N", 2); break;
         case ZQField::Held::kText: {
           const ZQString& s = f->StringRef();
-          if (IsNumber(f->FieldType())) PutNumber(s.c_str(), size_t(s.length()));
+          if (IsNumericType(f->FieldType())) PutNumber(s.c_str(), size_t(s.length()));
           else PutText(s.c_str(), size_t(s.length()));
           break;
         }
@@ -93,12 +94,7 @@ class PgsqlWriter : public RecordWriter {
           out_.PutDate(d.Year(), d.Month(), d.Day());
           break;
         }
-        case ZQField::Held::kDateTime: {
-          ZQString s;
-          f->DateTimeRef().PrintIso(s);
-          out_.Put(s.c_str(), size_t(s.length()));
-          break;
-        }
+        case ZQField::Held::kDateTime: out_.PutDateTime(f->DateTimeRef()); break;
         case ZQField::Held::kBool: out_.Put(f->BoolVal() ? 't' : 'f'); break;
       }
     }
@@ -108,9 +104,6 @@ class PgsqlWriter : public RecordWriter {
   void End() override { out_.Put("\\.\nCOMMIT;\n"); }
 
  private:
-  static bool IsNumber(FIELDTYPE t) {
-    return t == FT_NUMERIC || t == FT_INTEGER || t == FT_FLOAT || t == FT_CURRENCY;
-  }
 
   // A number held as the table's text: as it stands when it is one (no
   // blanks, a sign, digits, a point, an exponent), else NULL: text that

@@ -1,5 +1,6 @@
 #include "engine/writers.h"
 
+#include "engine/convert_values.h"
 #include "engine/report.h"
 #include "engine/text_util.h"
 
@@ -11,16 +12,6 @@
 #include <vector>
 
 namespace {
-
-bool IsNumericFamily(FIELDTYPE t) {
-  return t == FT_NUMERIC || t == FT_INTEGER || t == FT_FLOAT || t == FT_CURRENCY;
-}
-
-void PutDateTime(OutBuf& out, const ZQDateTime& dt) {
-  ZQString s;
-  dt.PrintIso(s);
-  out.Put(s.c_str(), size_t(s.length()));
-}
 
 // ---------------------------------------------------------------------------
 // CSV
@@ -158,7 +149,7 @@ class CsvWriter : public RecordWriter {
           out_.PutDate(d.Year(), d.Month(), d.Day());
           break;
         }
-        case ZQField::Held::kDateTime: PutDateTime(out_, f->DateTimeRef()); break;
+        case ZQField::Held::kDateTime: out_.PutDateTime(f->DateTimeRef()); break;
         case ZQField::Held::kBool: out_.Put(f->BoolVal() ? "true" : "false"); break;
       }
     }
@@ -215,7 +206,7 @@ class JsonlWriter : public RecordWriter {
         case ZQField::Held::kBlank: out_.Put("null", 4); break;
         case ZQField::Held::kText: {
           const ZQString& s = f->StringRef();
-          if (IsNumericFamily(f->FieldType())) {
+          if (IsNumericType(f->FieldType())) {
             PutNumberText(s);
           } else {
             PutJsonString(out_, s.c_str(), size_t(s.length()));
@@ -233,7 +224,7 @@ class JsonlWriter : public RecordWriter {
         }
         case ZQField::Held::kDateTime:
           out_.Put('"');
-          PutDateTime(out_, f->DateTimeRef());
+          out_.PutDateTime(f->DateTimeRef());
           out_.Put('"');
           break;
         case ZQField::Held::kBool: out_.Put(f->BoolVal() ? "true" : "false"); break;

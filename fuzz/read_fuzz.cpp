@@ -18,6 +18,7 @@
 #include <string>
 
 #include "connector/frdbase.h"
+#include "fuzz/scratch_file.h"
 #include "host/zqutil.h"
 
 namespace {
@@ -27,35 +28,6 @@ constexpr int32_t kMaxRecords = 100000;
 
 void Quiet(void*, int, BATCHERR, const char*) {}
 
-std::string g_dir;
-
-const std::string& TablePath() {
-  static const std::string path = [] {
-    char dir[] = "/tmp/zqdbse-fuzz-XXXXXX";
-    if (mkdtemp(dir) != nullptr) {
-      g_dir = dir;
-      atexit([] {
-        unlink((g_dir + "/t.dbf").c_str());
-        rmdir(g_dir.c_str());
-      });
-      return g_dir + "/t.dbf";
-    }
-    return std::string("/tmp/zqdbse-fuzz-") + std::to_string(getpid()) + ".dbf";
-  }();
-  return path;
-}
-
-// The dialect whose version bytes include `v`, as far as one stands out.
-int NaturalDialect(uint8_t v) {
-  switch (v) {
-    case 0x02: return 0;
-    case 0xFE: return 3;
-    case 0xF5: return 6;
-    case 0xE5: return 8;
-    case 0x30: return 10;
-    default: return (v & 7) == 3 ? ((v & 0x08) ? 2 : 1) : 5;
-  }
-}
 
 void ReadAll(const char* path, int dialect, int memo_policy, int codepage) {
   ZQFromDbase* spoke = NewFromDbase(ZQSpokeDef{});
@@ -89,14 +61,11 @@ void ReadAll(const char* path, int dialect, int memo_policy, int codepage) {
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   if (size > kMaxInput) return 0;
   SetLogSink(Quiet, nullptr);
-  const std::string& path = TablePath();
-  FILE* f = fopen(path.c_str(), "wb");
-  if (f == nullptr) return 0;
-  if (size > 0) fwrite(data, 1, size, f);
-  fclose(f);
+  static const std::string path = fuzz::ScratchDir("read") + "/t.dbf";
+  if (!fuzz::WriteScratch(path, data, size)) return 0;
 
   uint8_t first = size > 0 ? data[0] : 0;
-  int natural = NaturalDialect(first);
+  int natural = fuzz::NaturalDialect(first);
   int picked = (first >> 3) % 11;
   ReadAll(path.c_str(), natural, 1, 0);
   if (natural != 2) ReadAll(path.c_str(), 2, 0, 850);

@@ -19,6 +19,7 @@
 #include <string>
 
 #include "connector/todbase.h"
+#include "fuzz/scratch_file.h"
 #include "host/endian.h"
 #include "host/zqutil.h"
 
@@ -28,39 +29,7 @@ constexpr size_t kMaxInput = 1 << 20;
 
 void Quiet(void*, int, BATCHERR, const char*) {}
 
-std::string g_dir;
 
-const std::string& Dir() {
-  static const std::string dir = [] {
-    char d[] = "/tmp/zqdbse-wfuzz-XXXXXX";
-    if (mkdtemp(d) == nullptr) return std::string("/tmp");
-    g_dir = d;
-    atexit([] {
-      for (const char* n : {"t.dbf", "t.dbt", "t.fpt", "t.smt"}) unlink((g_dir + "/" + n).c_str());
-      rmdir(g_dir.c_str());
-    });
-    return g_dir;
-  }();
-  return dir;
-}
-
-void WriteFile(const std::string& path, const uint8_t* data, size_t size) {
-  FILE* f = fopen(path.c_str(), "wb");
-  if (f == nullptr) return;
-  if (size > 0) fwrite(data, 1, size, f);
-  fclose(f);
-}
-
-int NaturalDialect(uint8_t v) {
-  switch (v) {
-    case 0x02: return 0;
-    case 0xFE: return 3;
-    case 0xF5: return 6;
-    case 0xE5: return 8;
-    case 0x30: return 10;
-    default: return (v & 7) == 3 ? ((v & 0x08) ? 2 : 1) : 5;
-  }
-}
 
 // One value for every field: which one goes by the field's type and `round`.
 void Fill(ZQRecord& layout, int round) {
@@ -123,14 +92,15 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   const uint8_t* table = data + 4;
   const uint8_t* memo = table + n;
   size_t memo_size = size - 4 - n;
-  const std::string path = Dir() + "/t.dbf";
+  const std::string& dir = fuzz::ScratchDir("write");
+  const std::string path = dir + "/t.dbf";
   uint8_t first = n > 0 ? table[0] : 0;
-  int natural = NaturalDialect(first);
+  int natural = fuzz::NaturalDialect(first);
   for (int mode : {1, 2})
     for (int dialect : {natural, 2}) {
       // Each run starts from the input's files: the one before changed them.
-      WriteFile(path, table, n);
-      for (const char* ext : {"dbt", "fpt", "smt"}) WriteFile(Dir() + "/t." + ext, memo, memo_size);
+      fuzz::WriteScratch(path, table, n);
+      for (const char* ext : {"dbt", "fpt", "smt"}) fuzz::WriteScratch(dir + "/t." + ext, memo, memo_size);
       Run(path, dialect, mode);
     }
   return 0;

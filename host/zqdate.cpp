@@ -96,12 +96,17 @@ int ZQDateTime::Day() const {
   return d;
 }
 
-void ZQDateTime::PrintIso(ZQString& out) const {
+int ZQDateTime::PrintIso(char* buf, size_t size) const {
   int32_t y, m, d;
   DateFromJulianDay(int64_t{days_} + kZQEpochJulianDay, y, m, d);
   int64_t s = seconds_;
-  char buf[48];
-  snprintf(buf, sizeof buf, "%04d-%02d-%02dT%02d:%02d:%02d", int(y), int(m), int(d),
-           int(s / 3600 % 100), int(s / 60 % 60), int(s % 60));
+  int n = snprintf(buf, size, "%04d-%02d-%02dT%02d:%02d:%02d", int(y), int(m), int(d), int(s / 3600 % 100),
+                   int(s / 60 % 60), int(s % 60));
+  return n < 0 ? 0 : n < int(size) ? n : int(size) - 1;
+}
+
+void ZQDateTime::PrintIso(ZQString& out) const {
+  char buf[kIsoSize];
+  PrintIso(buf, sizeof buf);
   out = buf;
 }

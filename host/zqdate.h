@@ -5,6 +5,7 @@
 // 2000-01-01 (Julian day 2451545).
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 
 #include "host/zqstring.h"
@@ -49,6 +50,10 @@ class ZQDateTime {
   int32_t Seconds() const { return seconds_; }
   // ISO 8601 "YYYY-MM-DDTHH:MM:SS".
   void PrintIso(ZQString& out) const;
+  // The same into `buf` (at most `size` bytes with its NUL; kIsoSize holds
+  // any): the length written.
+  static constexpr size_t kIsoSize = 48;
+  int PrintIso(char* buf, size_t size) const;
 
  private:
   int32_t days_ = 0;

@@ -5,8 +5,6 @@
 source "$(dirname "$0")/lib.bash" "$1"
 cd "$WORK" || exit 1
 
-patch() { printf "$3" | dd of="$1" bs=1 seek="$2" conv=notrunc 2>/dev/null; }
-
 # NAME C(10) of record 1 "alice" and five NULs; record 2 made live, its NAME
 # all NULs (records at 97 and 113, NAME one byte after the flag).
 make_table t.dbf
@@ -33,7 +31,7 @@ same "binary in CSV" "$(tr -d '\r' <"$OUT")" "ID,PIC,NOTE
 1,R0lGAAEC,plain
 2,YWI=,eAB5"
 expect_err "zqdb: warning: 3 binary values (PIC, NOTE) were written as base64"
-[ "$(wc -l <"$ERR")" -eq 1 ] && PASSED=$((PASSED + 1)) || fail "more than one warning: $(cat "$ERR")"
+ok "more than one warning: $(cat "$ERR")" test "$(wc -l <"$ERR")" -eq 1
 expect_run 0 convert b.dbf b.jsonl
 same "binary in JSON" "$(cat b.jsonl)" '{"ID":1,"PIC":"R0lGAAEC","NOTE":"plain"}
 {"ID":2,"PIC":"YWI=","NOTE":"eAB5"}'

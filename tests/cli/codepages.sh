@@ -7,12 +7,9 @@ cd "$WORK" || exit 1
 
 # hex FILE OFFSET COUNT: the bytes as plain hex
 hex() { od -An -tx1 -j "$2" -N "$3" "$1" | tr -d ' \n'; }
-set_driver() { printf "\x$2" | dd of="$1" bs=1 seek=29 conv=notrunc 2>/dev/null; }
 
 # A dBASE III table, NAME C(10), "M\x81ller" (Müller in code page 850).
-make_table dos.dbf
-printf 'M\x81ller' | dd of=dos.dbf bs=1 seek=98 conv=notrunc 2>/dev/null
-set_driver dos.dbf 02
+make_table dos.dbf && patch dos.dbf 98 'M\x81ller' && patch dos.dbf 29 '\x02'
 expect_run 0 info dos.dbf && expect_out "code page:   850 (language driver byte 0x02)"
 expect_run 0 cat dos.dbf && expect_out "Müller,42"
 expect_run 0 cat dos.dbf --codepage 0 && expect_out "$(printf 'M\x81ller,42')"
@@ -23,7 +20,7 @@ for name in 1252 cp1252 CP1252 windows-1252 "ANSI 1252"; do
   expect_run 0 cat dos.dbf --codepage "$name" && expect_out "$(printf 'M\xc2\x81ller,42')"
 done
 # No driver byte: a .cpg file beside the table, in any of its usual forms.
-set_driver dos.dbf 00
+patch dos.dbf 29 '\x00'
 expect_run 0 info dos.dbf && expect_out "code page:   none, bytes as they are (language driver byte 0x00, no .cpg file)"
 for cpg in 850 CP850 "OEM 850"; do
   printf '%s\n' "$cpg" >dos.cpg
@@ -42,7 +39,7 @@ printf 'NAME,NOTE\nZoë,"Straße, Øre"\n€ 5,x\n' >in.csv
 expect_run 0 convert in.csv w.dbf --schema "NAME C(8), NOTE M" --codepage 1252
 same "C field in 1252" "$(hex w.dbf 99 4)" "5a6feb20"          # Z o ë blank
 same ".cpg of 1252" "$(cat w.cpg)" "1252"
-grep -q "$(printf 'Stra\xdfe, \xd8re')" w.dbt && PASSED=$((PASSED + 1)) || fail "memo not in code page 1252"
+ok "memo not in code page 1252" grep -q "$(printf 'Stra\xdfe, \xd8re')" w.dbt
 expect_run 0 cat w.dbf && expect_out 'Zoë,"Straße, Øre"'
 # The same into 850, which has no euro sign: one warning, the count and the
 # first place; --strict refuses the run and leaves no table.
@@ -52,7 +49,7 @@ same ".cpg of 850" "$(cat d.cpg)" "850"
 same "C field in 850" "$(hex d.dbf 99 3)" "5a6f89"
 expect_run 1 convert in.csv s.dbf --schema "NAME C(8), NOTE M" --codepage 850 --strict
 expect_err 'zqdb: record 2, field NAME: "€ 5" has characters that code page 850 can'"'"'t hold'
-[ -e s.dbf ] && fail "s.dbf left behind" || PASSED=$((PASSED + 1))
+absent s.dbf
 # A DOS table to a Windows one in one run: --from-codepage, --to-codepage.
 expect_run 0 convert d.dbf win.dbf --from-codepage 850 --to-codepage windows-1252
 same "850 to 1252" "$(hex win.dbf 99 3)" "5a6feb"
@@ -65,13 +62,13 @@ same "append in 850" "$(hex copy.dbf 137 3)" "5a6f89"
 # A table replaced by one without a code page loses the old .cpg, with a word.
 printf 'NAME\nplain\n' >plain.csv
 expect_run 0 convert plain.csv copy.dbf && err_has "zqdb: warning: removed copy.cpg, the code page file"
-[ -e copy.cpg ] && fail "copy.cpg left behind" || PASSED=$((PASSED + 1))
+absent copy.cpg
 # Index keys hold the table's bytes in its code page, as other programs build
 # them; a width counts those bytes; keys and --seek speak UTF-8.
 printf 'CITY\nBesançon12\nÉvreux\nAbbeville\n' >cities.csv
 expect_run 0 convert cities.csv k.dbf --schema "CITY C(10)" --codepage 850 --index CITY=CITY
-[ ! -s "$ERR" ] && PASSED=$((PASSED + 1)) || fail "a value that fits its 10 bytes in 850 warned: $(cat "$ERR")"
-grep -qa "$(printf 'Besan\x87on12')" k.mdx && PASSED=$((PASSED + 1)) || fail "k.mdx lacks the key in code page 850"
+ok "a value that fits its 10 bytes in 850 warned: $(cat "$ERR")" not test -s "$ERR"
+ok "k.mdx lacks the key in code page 850" grep -qa "$(printf 'Besan\x87on12')" k.mdx
 expect_run 0 keys k.dbf --index CITY --seek "Év" && expect_out "Évreux,2"
 expect_run 0 convert cities.csv k.dbf --mode update --key CITY && expect_run 0 check k.dbf
 expect_run 0 info k.dbf && expect_out "records:     3 in the header"

@@ -55,23 +55,30 @@ absent() {
   done
 }
 
-# make_table PATH [VERSION_BYTE_HEX]: a dBASE III table (version 03 unless
-# given) with NAME C(10) and QTY N(5,0); two records, the second deleted.
-#   header: 03 | date 7C 01 01 | count 2 | header length 97 | record length 16
+# ok WHAT COMMAND...: passes when COMMAND succeeds (`not COMMAND` when it fails).
+ok() { local what=$1; shift; if "$@"; then PASSED=$((PASSED + 1)); else fail "$what"; fi; }
+not() { ! "$@"; }
+# out_is < TEXT: the last run's stdout is TEXT, the CRs of CSV line ends aside.
+out_is() {
+  if cmp -s - <(tr -d '\r' <"$OUT"); then PASSED=$((PASSED + 1)); else fail "stdout: $(head -c 300 "$OUT")"; fi
+}
+
+# Table bytes. bytes N...: a byte of each number; zeros N: N NUL bytes; le16 N:
+# two bytes, the low one first; patch FILE OFFSET BYTES: BYTES (printf escapes)
+# written over FILE at OFFSET.
+bytes() { local b h; for b in "$@"; do printf -v h %02x "$b"; printf "\\x$h"; done; }
+zeros() { local p; printf -v p '%*s' "$1" ''; printf "${p// /\\x00}"; }
+le16() { bytes $(($1 & 255)) $(($1 >> 8)); }
+patch() { printf "$3" | dd of="$1" bs=1 seek="$2" conv=notrunc 2>/dev/null; }
+# dbf_header VERSION RECORDS HEADER_LENGTH RECORD_LENGTH: a table's first 32
+# bytes, VERSION in hex, dated 1924-01-01 (7C 01 01).
+dbf_header() { printf "\x$1\x7c\x01\x01"; le16 "$2"; zeros 2; le16 "$3"; le16 "$4"; zeros 20; }
+# field NAME TYPE WIDTH [DECIMALS]: a 32-byte field descriptor.
+field() { printf '%s' "$1"; zeros $((11 - ${#1})); printf '%s' "$2"; zeros 4; bytes "$3" "${4:-0}"; zeros 14; }
+# make_table PATH [VERSION]: a dBASE III table (version 03 unless given) with
+# NAME C(10) and QTY N(5,0); two records, the second deleted.
 make_table() {
-  local v=${2:-03}
-  {
-    printf "\x$v\x7c\x01\x01\x02\x00\x00\x00\x61\x00\x10\x00"
-    printf '\x00%.0s' {1..20}
-    printf 'NAME\x00\x00\x00\x00\x00\x00\x00C\x00\x00\x00\x00\x0a\x00'
-    printf '\x00%.0s' {1..14}
-    printf 'QTY\x00\x00\x00\x00\x00\x00\x00\x00N\x00\x00\x00\x00\x05\x00'
-    printf '\x00%.0s' {1..14}
-    printf '\x0d'
-    printf ' alice        42'
-    printf '*bob           7'
-    printf '\x1a'
-  } >"$1"
+  { dbf_header "${2:-03}" 2 97 16; field NAME C 10; field QTY N 5; printf '\r alice        42*bob           7\x1a'; } >"$1"
 }
 
 finish() {

@@ -4,11 +4,6 @@
 # name, and a damaged module beside it skipped with one warning.
 source "$(dirname "$0")/lib.bash" "$1"
 
-# anywhere in stderr, not only its first line
-expect_err_any() {
-  if grep -qF -- "$1" "$ERR"; then PASSED=$((PASSED + 1)); else fail "stderr lacks '$1': $(head -c 300 "$ERR")"; fi
-}
-
 expect_run 0 formats && expect_out "DADBASE     dBASE IV" && expect_out "DAVFOXPRO   Visual FoxPro" &&
   expect_out "clipper   version=8" && expect_out "libzqdbse.so"
 
@@ -23,17 +18,14 @@ expect_run 0 convert "$WORK/in.csv" "$WORK/db4.dbf" --type vfoxpro --to 2 --no-p
   "$ZQDB" info "$WORK/db4.dbf" >"$OUT" && expect_out "dialect:     2 (dBASE IV)"
 expect_run 2 cat "$WORK/fox.dbf" --type nosuch && expect_err "no connector definition named nosuch"
 
-# Modules in a directory of our own: a copy of the real one is found there,
-# a damaged one and a text file with a trailer are skipped with a warning.
+# Modules in a directory of our own: a copy of the real one is found there, one
+# whose trailer is damaged (a zero in its last 16 bytes) is skipped with a warning.
 mkdir -p "$WORK/mods"
 module=$(dirname "$ZQDB")/libzqdbse.so
 cp "$module" "$WORK/mods/libgood.so"
-head -c 2000 "$module" >"$WORK/mods/libcut.so"
-tail -c 1212 "$module" >>"$WORK/mods/libcut.so"
-printf '\x00\x00\x00\x00' | dd of="$WORK/mods/libcut.so" bs=1 seek=$(($(stat -c %s "$WORK/mods/libcut.so") - 16)) conv=notrunc 2>/dev/null
-{ head -c 500 /dev/zero; tail -c 1212 "$module"; } >"$WORK/mods/libtext.so"
+{ head -c 2000 "$module"; tail -c 1212 "$module" | head -c 1196; zeros 4; tail -c 12 "$module"; } >"$WORK/mods/libcut.so"
 ZQDB_MODULE_PATH="$WORK/mods" expect_run 0 formats && expect_out "$WORK/mods/libgood.so" &&
-  expect_err_any "libcut.so is skipped" && expect_err_any "libtext.so is skipped"
+  err_has "libcut.so is skipped"
 expect_run 0 --modules "$WORK/mods" cat "$WORK/fox.dbf" --format jsonl && expect_out '"NAME":"ann"'
 # A loadable library with a valid trailer but none of the factories it names
 # (a second copy of the host library, which AddressSanitizer would report).
@@ -45,5 +37,5 @@ ASAN_OPTIONS=${ASAN_OPTIONS:+$ASAN_OPTIONS:}detect_odr_violation=0 expect_run 1 
 mkdir -p "$WORK/lonely"
 cp "$ZQDB" "$WORK/lonely/zqdb"
 out=$(cd "$WORK/lonely" && LD_LIBRARY_PATH=$(dirname "$ZQDB") ./zqdb info "$WORK/fox.dbf" 2>&1); rc=$?
-if [ "$rc" = 1 ] && grep -q "no connector module found" <<<"$out"; then PASSED=$((PASSED + 1)); else fail "no module: exit $rc: $out"; fi
+ok "no module: exit $rc: $out" test "$rc" = 1 -a "${out/no connector module found/}" != "$out"
 finish

@@ -4,17 +4,12 @@
 source "$(dirname "$0")/lib.bash" "$1"
 cd "$WORK" || exit 1
 
-
 # value, schema, target dialect, the error's end ("" = it fits); each a line
 while IFS='|' read -r value schema to want; do
   printf 'V\n%s\n' "$value" >n.csv
   rm -f n.dbf
-  if [ -z "$want" ]; then
-    expect_run 0 convert n.csv n.dbf --schema "V $schema" --to "$to"
-  else
-    expect_run 1 convert n.csv n.dbf --schema "V $schema" --to "$to" && expect_err "zqdb: record 1, field V: \"$value\" $want"
-    absent n.dbf
-  fi
+  expect_run "$([ -z "$want" ]; echo $?)" convert n.csv n.dbf --schema "V $schema" --to "$to" || continue
+  [ -n "$want" ] && expect_err "zqdb: record 1, field V: \"$value\" $want" && absent n.dbf
 done <<'ROWS'
 12345|N(3)|2|doesn't fit a N(3) field
 12345|N(3)|4|doesn't fit a N(3) field
@@ -46,10 +41,11 @@ absent b3.dbf
 printf 'Y\n-922337203685477.5807\n922337203685477.5807\n0.0001\n2.3\n' >y.csv
 expect_run 0 convert y.csv y.dbf --schema "Y Y" --to 10
 expect_run 0 convert y.dbf y2.dbf
-expect_run 0 cat y2.dbf --format jsonl
-if [ "$(tr -d '\r' <"$OUT")" = '{"Y":-922337203685477.5807}
+expect_run 0 cat y2.dbf --format jsonl && out_is <<'X'
+{"Y":-922337203685477.5807}
 {"Y":922337203685477.5807}
 {"Y":0.0001}
-{"Y":2.3}' ]; then PASSED=$((PASSED + 1)); else fail "currency in JSON: $(cat "$OUT")"; fi
+{"Y":2.3}
+X
 expect_run 0 cat y2.dbf && expect_out "-922337203685477.5807"
 finish

@@ -55,34 +55,26 @@ expect_run 0 info "$WORK/t7.dbf" && expect_out "dialect:     7 (Enable OA (Datab
 expect_run 0 info "$WORK/t2.dbf" && expect_out "dialect:     2 (dBASE IV)"
 
 # A dBASE II table reads under dialect 0 or by its byte; dBASE IV refuses it.
-{
-  printf '\x02\x01\x00\x01\x01\x01\x06\x00'            # version, count 1, date, record length 6
-  printf 'NAME\x00\x00\x00\x00\x00\x00\x00C\x05\x00\x00\x00'
-  printf '\x0d'
-  printf '\x00%.0s' {1..496}                              # descriptor room: first record at 521
-  printf ' hello'
-} >"$WORK/db2.dbf"
+# Version, count 1, date, record length 6, one descriptor, and room for more:
+# the first record at 521.
+{ printf '\x02\x01\x00\x01\x01\x01\x06\x00NAME\0\0\0\0\0\0\0C\x05\0\0\0\r'; zeros 496
+  printf ' hello'; } >"$WORK/db2.dbf"
 expect_run 0 cat "$WORK/db2.dbf" --dialect "dbase ii" --format jsonl && expect_out '{"NAME":"hello"}'
 expect_run 0 cat "$WORK/db2.dbf" --format jsonl && expect_out '{"NAME":"hello"}'
 
 # --- Tables that can't be read: status 1, "zqdb: Error opening data file" ----
-: >"$WORK/empty.dbf"
-printf 'not a table at all, just text\n' >"$WORK/text.dbf"
+# (each reason's own message is checked in usage.sh); cat prints nothing.
 head -c 50 "$WORK/t.dbf" >"$WORK/cut.dbf"  # cut inside the field descriptors
-for args in "cat $WORK/missing.dbf" "info $WORK/missing.dbf" "cat $WORK/empty.dbf" "cat $WORK" \
-  "cat $WORK/text.dbf" "cat $WORK/cut.dbf" "cat $WORK/vfp.dbf --dialect 2" "cat $WORK/t.dbf --dialect 10" \
-  "cat $WORK/db2.dbf --dialect 2"; do
+for args in "$WORK/cut.dbf" "$WORK/vfp.dbf --dialect 2" "$WORK/t.dbf --dialect 10" "$WORK/db2.dbf --dialect 2"; do
   # shellcheck disable=SC2086
-  expect_run 1 $args && expect_err "zqdb: Error opening data file"
-  [ -s "$OUT" ] && fail "zqdb $args: output for a table that can't be read"
+  expect_run 1 cat $args && expect_err "zqdb: Error opening data file"
+  ok "zqdb cat $args: output for a table that can't be read" not test -s "$OUT"
 done
-expect_run 1 cat "$WORK/missing.dbf" && expect_err "zqdb: Error opening data file $WORK/missing.dbf"
 
 # --- Usage errors: status 2, "zqdb: ..." first, before any table is opened ----
 expect_run 2 && expect_err "usage: zqdb"
 expect_run 2 frobnicate "$WORK/t.dbf" && expect_err "zqdb: unknown command"
 expect_run 2 cat "$WORK/t.dbf" --bogus && expect_err "zqdb: unknown option --bogus"
-expect_run 2 cat "$WORK/t.dbf" --codepage abc && expect_err "zqdb: unknown code page"
 while read -r args; do
   eval "set -- $args"
   expect_run 2 "$@" && expect_err "zqdb: "

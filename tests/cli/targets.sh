@@ -3,13 +3,11 @@
 # name of a format zqdb doesn't write is a usage error.
 source "$(dirname "$0")/lib.bash" "$1"
 cd "$WORK" || exit 1
-
-
 make_table t.dbf
 expect_run 0 convert t.dbf -
 same "CSV on standard output" "$(tr -d '\r' <"$OUT")" "NAME,QTY
 alice,42"
-[ -e ./- ] && fail "a file named - was made" || PASSED=$((PASSED + 1))
+absent ./-
 expect_run 0 convert t.dbf - --format jsonl && same "JSON lines on standard output" "$(cat "$OUT")" '{"NAME":"alice","QTY":42}'
 expect_run 2 convert t.dbf - --to 4 && expect_err "zqdb: a table can't be written to standard output"
 expect_run 2 convert t.dbf - --format table
@@ -29,7 +27,7 @@ same "a CSV link stays" "$(readlink link.csv)$(tr -d '\r' <real/out.csv | tail -
 # A link to nothing is refused, and nothing is made.
 ln -s real/none.dbf dangling.dbf
 expect_run 1 convert t.dbf dangling.dbf && expect_err "zqdb: dangling.dbf is a symbolic link to a file that doesn't exist"
-[ -e real/none.dbf ] && fail "a table was made through a link to nothing" || PASSED=$((PASSED + 1))
+absent real/none.dbf
 
 # A FIFO takes CSV as it is written, but no table; a directory nothing.
 mkfifo pipe.csv pipe.dbf
@@ -39,18 +37,18 @@ wait
 same "CSV through a FIFO" "$(tr -d '\r' <from_pipe)" "NAME,QTY
 alice,42"
 expect_run 1 convert t.dbf pipe.dbf && expect_err "zqdb: pipe.dbf is a device, FIFO or socket: a table is written to a regular file"
-[ -p pipe.dbf ] && PASSED=$((PASSED + 1)) || fail "pipe.dbf is no FIFO any more"
+ok "pipe.dbf is no FIFO any more" test -p pipe.dbf
 mkdir dir.dbf
 expect_run 1 convert t.dbf dir.dbf && expect_err "zqdb: dir.dbf is a directory"
 # /dev/stdout on a pipe is a device link: refused for a table, and it stays
 # the link it was (run as root, the link was once replaced by a table).
 "$ZQDB" convert t.dbf /dev/stdout 2>"$ERR" | cat >/dev/null
 same "a table to /dev/stdout on a pipe" "$(head -c 57 "$ERR")" "zqdb: /dev/stdout is a device, FIFO or socket: a table is"
-[ -L /dev/stdout ] && PASSED=$((PASSED + 1)) || fail "/dev/stdout is no link any more"
+ok "/dev/stdout is no link any more" test -L /dev/stdout
 
 # Names of formats zqdb doesn't write.
 for name in out.tsv out.txt OUT.TXT; do
   expect_run 2 convert t.dbf "$name" && expect_err "zqdb: zqdb writes tables, CSV, JSON-lines, SQLite and PostgreSQL files, not $name"
-  [ -e "$name" ] && fail "$name was made" || PASSED=$((PASSED + 1))
+  absent "$name"
 done
 finish

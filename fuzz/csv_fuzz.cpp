@@ -1,21 +1,16 @@
 // Fuzzes the CSV reader and the CSV source's type inference: any bytes as a
 // CSV file, read whole, then as a source spoke with inferred types.
-#include <unistd.h>
-
 #include <cstddef>
 #include <cstdint>
-#include <cstdio>
 #include <string>
 
 #include "engine/csv_reader.h"
 #include "engine/csv_source.h"
+#include "fuzz/scratch_file.h"
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
-  static const std::string path = "/tmp/zqdb-csv-fuzz-" + std::to_string(getpid()) + ".csv";
-  FILE* f = fopen(path.c_str(), "wb");
-  if (f == nullptr) return 0;
-  fwrite(data, 1, size, f);
-  fclose(f);
+  static const std::string path = fuzz::ScratchDir("csvfuzz") + "/t.csv";
+  if (!fuzz::WriteScratch(path, data, size)) return 0;
   CsvReader r;
   std::string error;
   if (r.Open(path, &error)) {

@@ -6,7 +6,7 @@ non-ASCII text), and a comparison of a database's rows with zqdb's."""
 import decimal
 import os
 
-from common import run, zqdb_rows
+from common import must, zqdb_rows, ZQDB
 
 DIALECTS = [0, 1, 2, 3, 4, 6, 7, 8, 9, 10]
 
@@ -26,14 +26,9 @@ def make_corpus(d):
     src = os.path.join(d, "corpus.csv")
     with open(src, "w", encoding="utf-8") as f:
         f.write(CSV)
-    tables = {}
-    for v in DIALECTS:
-        t = os.path.join(d, "corpus%d.dbf" % v)
-        rc, _, err = run([os.environ.get("ZQDB_PATH", ""), "convert", src, t, "--to", str(v), "--schema", SCHEMA,
-                          "--quiet", "--no-progress"])
-        if rc != 0:
-            raise AssertionError("making %s: %s" % (t, err.strip()))
-        tables[v] = t
+    tables = {v: os.path.join(d, "corpus%d.dbf" % v) for v in DIALECTS}
+    for v, t in tables.items():
+        must([ZQDB, "convert", src, t, "--to", str(v), "--schema", SCHEMA, "--quiet", "--no-progress"])
     return tables
 
 

@@ -6,7 +6,7 @@ import json
 import os
 import subprocess
 
-from common import run, ZQDB
+from common import must, run, write_csv, ZQDB
 
 # Walks an index (argv: file, tag or "", form) and prints "W key recno" per
 # key, then seeks each key read from stdin and prints "S key recno" for the
@@ -54,17 +54,41 @@ def draw(rng, pool, n):
     return [common if rng.random() < 0.1 else rng.choice(pool) for _ in range(n)]
 
 
-def write_rows(path, header, rows):
-    with open(path, "w", encoding="ascii", newline="") as f:
-        f.write(header + "\r\n")
-        f.writelines(",".join(map(str, r)) + "\r\n" for r in rows)
+STATUS = ["open", "closed", "held", "void", ""]
 
 
-def must(cmd):
-    rc, out, err = run(cmd)
-    if rc != 0:
-        raise AssertionError("%s: exit %d: %s" % (os.path.basename(cmd[0]), rc, err.strip()[-400:]))
-    return out
+def status(recno):
+    """Field G of record `recno`: a few values in long runs."""
+    return STATUS[recno * 7 % len(STATUS)]
+
+
+def write_keys(path, keys, first_id):
+    """A CSV file of ID, K (the keys) and G, IDs counted from `first_id`."""
+    write_csv(path, ("ID", "K", "G"), [(first_id + i, k, status(first_id + i)) for i, k in enumerate(keys)])
+
+
+def tags_hold(s, label, table, index, recs):
+    """Tags K and G of `index` hold one key per record of `recs` (recno -> key)."""
+    check_index(s, label + " K", table, index, "K", [(k, r) for r, k in recs.items()])
+    check_index(s, label + " G", table, index, "G", [(status(r), r) for r in recs])
+
+
+def append_keys(s, d, label, table, index, keys, recs):
+    """Records of `keys` added by --mode append (no index option) go into
+    tags K and G of `index`; `recs` takes them."""
+    first, csv = len(recs) + 1, os.path.join(d, "more.csv")
+    write_keys(csv, keys, first)
+    must([ZQDB, "convert", csv, table, "--mode", "append", "--no-progress"])
+    recs.update(enumerate(keys, first))
+    tags_hold(s, label, table, index, recs)
+
+
+def convert(d, name, keys, *opts):
+    """The table `name`.dbf in d of the keys, made by zqdb convert with `opts`."""
+    csv, table = os.path.join(d, name + ".csv"), os.path.join(d, name + ".dbf")
+    write_keys(csv, keys, 1)
+    must([ZQDB, "convert", csv, table, "--no-progress", *opts])
+    return table
 
 
 def zq_keys(table, index, *opts):
@@ -126,7 +150,7 @@ def stale_table(d, name, n, *opts):
     n // 2; returns (table, {recno: key})."""
     keys = {r: ("k%02d" % (r * 7 % n) if r != n // 2 else MARKER) for r in range(1, n + 1)}
     csv, table = os.path.join(d, name + ".csv"), os.path.join(d, name + ".dbf")
-    write_rows(csv, "ID,K,G", ((r, k, "g") for r, k in keys.items()))
+    write_csv(csv, ("ID", "K", "G"), [(r, k, "g") for r, k in keys.items()])
     must([ZQDB, "convert", csv, table, "--no-progress", "--schema", "ID N(7), K C(10), G C(6)", *opts])
     return table, keys
 

@@ -31,9 +31,9 @@ import sys
 
 HERE = os.path.dirname(os.path.abspath(__file__))
 sys.path.insert(0, HERE)
-from common import Suite, workdir, ZQDB  # noqa: E402
-from index_common import (check_index, draw, first_records, key_pool, must, perl_walk, stale_and_mended,  # noqa: E402
-                          stale_table, write_rows, zq_keys)
+from common import must, Suite, workdir, write_csv, ZQDB  # noqa: E402
+from index_common import (append_keys, check_index, convert, draw, first_records, key_pool, perl_walk,  # noqa: E402
+                          stale_and_mended, stale_table, zq_keys)
 
 # (label, records, field width, distinct keys, fewest MDX and NDX levels)
 # A key of 100 bytes leaves 9 entries to an MDX node and 4 to an NDX node,
@@ -49,17 +49,8 @@ TREES = [
 # The four-level table gets a second tag, over a field of a few values in
 # long runs, and then records appended to it.
 APPEND_TO, APPENDED = "four levels", 1500
-STATUS = ["open", "closed", "held", "void", ""]
 
 s = Suite("index_dbase")
-
-
-def status(recno):
-    return STATUS[recno * 7 % len(STATUS)]
-
-
-def write_csv(path, keys, first_id):
-    write_rows(path, "ID,K,G", ((first_id + i, k, status(first_id + i)) for i, k in enumerate(keys)))
 
 
 def levels(index, tag=None):
@@ -90,13 +81,6 @@ def pairs(recs):
     return [(k, r) for r, k in recs.items()]
 
 
-def convert(d, name, keys, *opts):
-    csv, table = os.path.join(d, name + ".csv"), os.path.join(d, name + ".dbf")
-    write_csv(csv, keys, 1)
-    must([ZQDB, "convert", csv, table, "--no-progress", *opts])
-    return table
-
-
 # --- 1 and 2: character keys ------------------------------------------------
 
 def character_trees(d, tool):
@@ -119,20 +103,8 @@ def character_trees(d, tool):
             if tool:
                 same_as_xbase64(label + " NDX", tool, table, ndx)
             if label == APPEND_TO:
-                append(d, table, rng, pool, recs)
-
-
-def append(d, table, rng, pool, recs):
-    """Records added by --mode append go into every MDX tag."""
-    first = len(recs) + 1
-    keys = draw(rng, pool + ["new %d" % i for i in range(100)], APPENDED)
-    csv = os.path.join(d, "more.csv")
-    write_csv(csv, keys, first)
-    must([ZQDB, "convert", csv, table, "--mode", "append", "--no-progress"])
-    recs.update(enumerate(keys, first))
-    mdx = table[:-4] + ".mdx"
-    check_index(s, "append K", table, mdx, "K", pairs(recs))
-    check_index(s, "append G", table, mdx, "G", [(status(r), r) for r in recs])
+                more = draw(rng, pool + ["new %d" % i for i in range(100)], APPENDED)
+                append_keys(s, d, "append", table, mdx, more, recs)
 
 
 # --- 3: numeric keys ----------------------------------------------------------
@@ -224,7 +196,7 @@ def libxbase64_files(d, tool):
     for expr, schema, rows, depth, finding in XB_CASES:
         label = "libxbase64's %s, %d records" % (expr, len(rows))
         with s.case(label):
-            write_rows(csv, "NAME,QTY,BORN", rows)
+            write_csv(csv, ("NAME", "QTY", "BORN"), rows)
             must([ZQDB, "convert", csv, table, "--schema", schema, "--no-progress"])
             must([tool, "index", table, ndx, expr])
             s.check(label + " depth", levels(ndx) >= depth, "%d levels" % levels(ndx))

@@ -29,9 +29,9 @@ import sys
 
 HERE = os.path.dirname(os.path.abspath(__file__))
 sys.path.insert(0, HERE)
-from common import Suite, workdir, ZQDB  # noqa: E402
-from index_common import (check_index, draw, key_pool, must, perl_walk, stale_and_mended, stale_table,  # noqa: E402
-                          write_rows, zq_keys)
+from common import must, Suite, workdir, write_csv, ZQDB  # noqa: E402
+from index_common import (append_keys, check_index, convert, draw, key_pool, perl_walk, stale_and_mended,  # noqa: E402
+                          stale_table, status, tags_hold, write_keys, zq_keys)
 
 import dbf  # noqa: E402
 
@@ -45,7 +45,6 @@ TREES = [
     ("100,000 keys", "foxpro", 100_000, 32, 30_000, 4, 4, ()),
 ]
 CHANGED = 300  # records appended, and records touched by an update
-STATUS = ["open", "closed", "held", "void", ""]
 
 # Fills tag K of a CDX (argv: table, CDX) with the key of every record, as
 # Perl's insert does it, one key at a time. It prints its splits: ignored.
@@ -68,14 +67,6 @@ PERL_CDX_RECORDS = [1, 30, 1000, 1800]
 s = Suite("index_fox")
 
 
-def status(recno):
-    return STATUS[recno * 7 % len(STATUS)]
-
-
-def write_csv(path, keys, first_id):
-    write_rows(path, "ID,K,G", ((first_id + i, k, status(first_id + i)) for i, k in enumerate(keys)))
-
-
 def levels(index, header):
     """The depth of a Fox index whose tree header is at `header`, down its
     first entries. Header: root offset at 0, key length at 12 (both little-
@@ -95,22 +86,6 @@ def levels(index, header):
 # zqdb writes a CDX's tag list first (header and root, 1024 + 512 bytes),
 # then each tag's header at the end of the file: the first tag's at 1536.
 FIRST_TAG = 1536
-
-
-def convert(d, name, keys, *opts):
-    csv, table = os.path.join(d, name + ".csv"), os.path.join(d, name + ".dbf")
-    write_csv(csv, keys, 1)
-    must([ZQDB, "convert", csv, table, "--no-progress", *opts])
-    return table
-
-
-def check_tags(label, table, recs, updated=()):
-    """Tags K and G hold one key per record of `recs` (recno -> key), and
-    the old keys of the `updated` records ((old key, recno)) beside them
-    (an unchanged key goes in again)."""
-    cdx = table[:-4] + ".cdx"
-    check_index(s, label + " K", table, cdx, "K", [(k, r) for r, k in recs.items()] + list(updated))
-    check_index(s, label + " G", table, cdx, "G", [(status(r), r) for r in list(recs) + [r for _, r in updated]])
 
 
 # --- 1 and 2: zqdb's files walked by Perl -----------------------------------
@@ -139,21 +114,14 @@ def change(d, label, table, rng, pool, recs):
     """Append, then update by ID: half the source names records of the table
     (their keys change, and the rebuilt tags hold the new key only), half are
     new."""
-    csv = os.path.join(d, "more.csv")
-    pool = pool + ["new %d" % i for i in range(100)]
-    first = len(recs) + 1
-    keys = draw(rng, pool, CHANGED)
-    write_csv(csv, keys, first)
-    must([ZQDB, "convert", csv, table, "--mode", "append", "--no-progress"])
-    recs.update(enumerate(keys, first))
-    check_tags(label + " append", table, recs)
-
+    pool, cdx, csv = pool + ["new %d" % i for i in range(100)], table[:-4] + ".cdx", os.path.join(d, "more.csv")
+    append_keys(s, d, label + " append", table, cdx, draw(rng, pool, CHANGED), recs)
     ids = rng.sample(sorted(recs), CHANGED // 2) + list(range(len(recs) + 1, len(recs) + 1 + CHANGED // 2))
     rows = [(i, k, status(i)) for i, k in zip(ids, draw(rng, pool, len(ids)))]
-    write_rows(csv, "ID,K,G", rows)
+    write_csv(csv, ("ID", "K", "G"), rows)
     must([ZQDB, "convert", csv, table, "--mode", "update", "--key", "ID", "--no-progress"])
     recs.update((i, k) for i, k, _ in rows)
-    check_tags(label + " update", table, recs)
+    tags_hold(s, label + " update", table, cdx, recs)
     must([ZQDB, "check", table])
 
 
@@ -187,7 +155,6 @@ def perl_files(d):
             s.check_clean(label, table, "--index", idx, "--dialect", "foxpro")
 
     # An empty CDX with tag K, of a table with no records.
-    write_rows(os.path.join(d, "empty.csv"), "ID,K,G", [])
     empty = convert(d, "empty", [], "--to", "foxpro", "--schema", "ID N(7), K C(10), G C(6)", "--index", "K=K")
     for n in PERL_CDX_RECORDS:
         label = "Perl's CDX tag of %d records" % n
@@ -208,7 +175,7 @@ def perl_files(d):
         t.close()
         perl_insert(empty, table)
         more = draw(rng, key_pool(rng, 10, 40), 200)
-        write_csv(os.path.join(d, "py_more.csv"), more, len(keys) + 1)
+        write_keys(os.path.join(d, "py_more.csv"), more, len(keys) + 1)
         must([ZQDB, "convert", os.path.join(d, "py_more.csv"), table, "--mode", "append", "--no-progress"])
         same_walk("python3-dbf's table", table, table[:-4] + ".cdx", "K", len(keys) + len(more))
         s.check("python3-dbf's table keys", sorted(zq_keys(table, "K")) == sorted(

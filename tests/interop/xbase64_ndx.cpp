@@ -14,15 +14,12 @@
 // upper half, and its walks seek far past the end of the file. The library
 // calls these two through the dynamic linker, so the definitions here, which
 // decode the 4 little-endian bytes into the whole long, take their place.
-xbLong xbXBase::GetLong(const char* p) {
-  const uint8_t* b = reinterpret_cast<const uint8_t*>(p);
-  return int32_t(uint32_t(b[0]) | uint32_t(b[1]) << 8 | uint32_t(b[2]) << 16 | uint32_t(b[3]) << 24);
-}
-
 xbULong xbXBase::GetULong(const char* p) {
   const uint8_t* b = reinterpret_cast<const uint8_t*>(p);
   return uint32_t(b[0]) | uint32_t(b[1]) << 8 | uint32_t(b[2]) << 16 | uint32_t(b[3]) << 24;
 }
+
+xbLong xbXBase::GetLong(const char* p) { return int32_t(GetULong(p)); }
 
 namespace {
 

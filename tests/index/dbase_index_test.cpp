@@ -93,26 +93,20 @@ TEST(IndexExpression, BuildsKeysOfTextPaddedAndNumbersAsDoubles) {
 // NDX
 
 TEST(NdxFile, IsMadeGrownAndClosedAsLaidOut) {
-  std::string path = ScratchPath("figures.ndx");
-  KeyField unique(10, false, true), f(10);
-  { ZQDBMdx ix("unused", path.c_str(), unique.fields, &unique.def); }
-  EXPECT_EQ(ReadFile(path)[23], 1);
-  {
-    ZQDBMdx ix("unused", path.c_str(), f.fields, &f.def);
-    ASSERT_TRUE(ix.OK());
-  }
-  Bytes fresh = ReadFile(path);
+  const Form ndx{"figures.ndx", false, false};
+  EXPECT_EQ(Made(ndx, "unused", 10, {}, true)[23], 1);  // unique
+  Bytes fresh = Made(ndx, "unused", 10, {});
   ASSERT_EQ(fresh.size(), 1024u);
   // root 1, blocks 2, key length 10, 25 keys of 20 bytes, duplicates, expression NAME
   ExpectBytes(fresh, 0, {1, 0, 0, 0, 2, 0, 0, 0, 0, 0, 0, 0, 10, 0, 25, 0, 0, 0, 20, 0,
                          0, 0, 0, 0, 'N', 'A', 'M', 'E', 0});
   EXPECT_TRUE(std::all_of(fresh.begin() + 512, fresh.end(), [](uint8_t b) { return b == 0; }));
   {
-    ZQDBMdx ix("unused", path.c_str());
-    ASSERT_TRUE(ix.OK());
-    for (int i = 0; i < 26; ++i) ASSERT_TRUE(AddKey(ix, Key(i, 10), i));
+    Index ix(ndx, "unused");
+    ASSERT_TRUE(ix->OK());
+    for (int i = 0; i < 26; ++i) ASSERT_TRUE(AddKey(*ix, Key(i, 10), i));
   }
-  Bytes b = ReadFile(path);
+  Bytes b = ReadFile(ScratchPath(ndx.name));
   ASSERT_EQ(b.size(), 4u * 512);
   // The root moved to block 2 of 4 (the header, the old root now the right
   // part, the new root, the left part). The root: one key, the left part
@@ -126,13 +120,7 @@ TEST(NdxFile, IsMadeGrownAndClosedAsLaidOut) {
 // MDX
 
 TEST(MdxFile, OneTagIsLaidOutAsOtherProgramsReadIt) {
-  KeyField f(30, true, true);
-  std::string base = Base("figures");
-  {
-    ZQDBMdx ix(base.c_str(), "NAME", f.fields, &f.def);
-    ASSERT_TRUE(ix.OK());
-  }
-  Bytes b = ReadFile(base + ".mdx");
+  Bytes b = Made(Form{"NAME", false, false}, "figures", 30, {}, true);
   ASSERT_EQ(b.size(), 4096u);
   auto text = [&b](size_t at) { return std::string(reinterpret_cast<const char*>(&b[at])); };
   EXPECT_EQ(text(4), "figures");
@@ -151,14 +139,9 @@ TEST(MdxFile, OneTagIsLaidOutAsOtherProgramsReadIt) {
 }
 
 TEST(MdxFile, TheRootMovesAndTheHeadersFollowAtClose) {
-  KeyField f(10);
-  std::string base = Base("rootmove");
-  {
-    ZQDBMdx ix(base.c_str(), "NAME", f.fields, &f.def);
-    ASSERT_TRUE(ix.OK());
-    for (int i = 0; i < 64; ++i) ASSERT_TRUE(AddKey(ix, Key(i, 10), i));
-  }
-  Bytes b = ReadFile(base + ".mdx");
+  std::vector<std::string> keys;
+  for (int i = 0; i < 64; ++i) keys.push_back(Key(i, 10));
+  Bytes b = Made(Form{"NAME", false, false}, "rootmove", 10, keys);
   ASSERT_EQ(b.size(), 12u * 512);
   // The 64th key moved the root to block 8; three nodes of two units; the
   // next free block is the file's end. The root: one entry for the left part
@@ -211,13 +194,9 @@ TEST(MdxFile, SplitsBesideRunsOfEqualKeysOrInsideThem) {
   } cases[] = {{"AABBBBCDE", 6}, {"ABCCCCCCD", 5}, {"CCCCCCCCC", 6}};
   for (const Case& c : cases) {
     SCOPED_TRACE(c.keys);
-    KeyField f(117);  // entries of 124 bytes: 8 keys in a node
-    std::string base = Base("split");
-    {
-      ZQDBMdx ix(base.c_str(), "NAME", f.fields, &f.def);
-      for (int i = 0; c.keys[i] != '\0'; ++i) ASSERT_TRUE(AddKey(ix, std::string(117, c.keys[i]), i));
-    }
-    Bytes b = ReadFile(base + ".mdx");
+    std::vector<std::string> keys;  // entries of 124 bytes: 8 keys in a node
+    for (const char* k = c.keys; *k != '\0'; ++k) keys.emplace_back(117, *k);
+    Bytes b = Made(Form{"NAME", false, false}, "split", 117, keys);
     uint32_t root = Le32At(b, 4 * 512);
     uint32_t left = Le32At(b, root * 512 + 8);
     EXPECT_EQ(Le32At(b, left * 512), c.left);
@@ -228,25 +207,21 @@ TEST(MdxFile, SplitsBesideRunsOfEqualKeysOrInsideThem) {
 // The cursor by ordinal
 
 TEST(IndexCursor, MovesOneKeyAtATimeBothWaysWhereTheKindCan) {
-  KeyField f(10);
-  std::string ndx = ScratchPath("cursor.ndx"), base = Base("cursor");
-  for (const std::string& tag : {ndx, std::string("NAME")}) {
-    SCOPED_TRACE(tag);
-    {
-      ZQDBMdx ix(base.c_str(), tag.c_str(), f.fields, &f.def);
-      for (int i = 0; i < 60; ++i) ASSERT_TRUE(AddKey(ix, Key(59 - i, 10), i));  // record 0 stored as 1
-    }
-    ZQDBMdx ix(base.c_str(), tag.c_str());
-    EXPECT_EQ(ix.GetFirst(), 59);
-    EXPECT_EQ(ix.GetRecord(30), 29);
-    EXPECT_EQ(ix.GetNext(), 28);
-    EXPECT_EQ(ix.GetRecord(59), 0);
-    EXPECT_EQ(ix.GetRecord(60), -1);  // past the last key
+  std::vector<std::string> keys;
+  for (int i = 0; i < 60; ++i) keys.push_back(Key(59 - i, 10));  // record 0 stored as 1
+  for (const Form& form : {Form{"cursor.ndx", false, false}, Form{"NAME", false, false}}) {
+    SCOPED_TRACE(form.name);
+    Made(form, "cursor", 10, keys);
+    Index ix(form, "cursor");
+    EXPECT_EQ(ix->GetFirst(), 59);
+    EXPECT_EQ(ix->GetRecord(30), 29);
+    EXPECT_EQ(ix->GetNext(), 28);
+    EXPECT_EQ(ix->GetRecord(59), 0);
+    EXPECT_EQ(ix->GetRecord(60), -1);  // past the last key
     // Back to the first: NDX steps back; an MDX tag can't.
-    EXPECT_EQ(ix.GetFirst(), ix.IsMdx() ? -1 : 59);
+    EXPECT_EQ(ix->GetFirst(), form.Tag() ? -1 : 59);
   }
-  ZQDBMdx none(base.c_str(), "NOSUCH");
-  EXPECT_EQ(none.GetRecord(0), -1);
+  EXPECT_EQ(Index(Form{"NOSUCH", false, false}, "cursor")->GetRecord(0), -1);
 }
 
 // ---------------------------------------------------------------------------
@@ -266,24 +241,19 @@ TEST(DbaseDamage, AMissingFileOrTagIsNotOk) {
 // bytes, dBASE and libxbase64 in the order of their values; a check by
 // value judges the second order as a check by bytes judges the first.
 TEST(DbaseTreeCheck, JudgesDoubleKeysByTheirBytesOrByTheirValues) {
-  KeyField f(8);
-  std::string path = ScratchPath("values.ndx");
-  {
-    ZQDBMdx ix("unused", path.c_str(), f.fields, &f.def);
-    for (double v : {1.0, 2.0, 3.0}) {
-      Bytes key = Dbl(v);
-      ASSERT_TRUE(AddKey(ix, std::string(key.begin(), key.end()), int32_t(v)));
-    }
-  }
-  Bytes bytes = ReadFile(path);  // one leaf at block 1: 2.0, 3.0, 1.0, entries of 16 bytes from offset 516
+  std::vector<std::string> keys;
+  for (double v : {1.0, 2.0, 3.0}) keys.emplace_back(reinterpret_cast<const char*>(Dbl(v).data()), 8);
+  const Form ndx{"values.ndx", false, false};
+  // One leaf at block 1: 2.0, 3.0, 1.0, entries of 16 bytes from offset 516.
+  Bytes bytes = Made(ndx, "unused", 8, keys);
   Bytes values = bytes;
   std::rotate(values.begin() + 516, values.begin() + 516 + 32, values.begin() + 516 + 48);  // 1.0, 2.0, 3.0
   for (const Bytes* file : {&bytes, &values}) {
     WriteScratch("values.ndx", *file);
-    ZQDBMdx ix("unused", path.c_str());
+    Index ix(ndx, "unused");
     ZQString byBytes, byValue;
-    EXPECT_EQ(ix.CheckTree(byBytes, false), file == &bytes ? 0 : 1) << byBytes.c_str();
-    EXPECT_EQ(ix.CheckTree(byValue, true), file == &bytes ? 1 : 0) << byValue.c_str();
+    EXPECT_EQ(ix->CheckTree(byBytes, false), file == &bytes ? 0 : 1) << byBytes.c_str();
+    EXPECT_EQ(ix->CheckTree(byValue, true), file == &bytes ? 1 : 0) << byValue.c_str();
   }
 }
 

@@ -25,7 +25,6 @@ std::string Table(const std::string& name) {
 // New files
 
 TEST(FoxFiles, NewFilesAreLaidOutByteForByte) {
-  const std::vector<uint8_t> noSiblings = {0xFF, 0xFF, 0xFF, 0xFF, 0xFF, 0xFF, 0xFF, 0xFF};
   struct Case {
     const char* name;  // with an extension an IDX file, else a CDX tag
     int width;
@@ -64,17 +63,13 @@ TEST(FoxFiles, NewFilesAreLaidOutByteForByte) {
   for (const Case& c : cases) {
     SCOPED_TRACE(c.name);
     KeyField f(c.width, c.compress, c.unique, c.numeric);
-    std::string base = Table("layout");
-    bool tag = strchr(c.name, '.') == nullptr;
-    std::string name = tag ? c.name : ScratchPath(c.name);
-    std::string path = tag ? base + ".cdx" : name;
-    ZQDBFoxIndex* taglist = nullptr;
+    const Form form{c.name, true, c.compress};
+    const std::string path = ScratchPath(form.File("layout"));
     {
-      ZQDBFoxIndex ix(base.c_str(), name.c_str(), f.fields, f.def, taglist);
-      ASSERT_TRUE(ix.OK()) << ix.Reason();
-      EXPECT_EQ(ix.Unique(), c.unique);
+      Index ix(form, "layout", &f);
+      ASSERT_TRUE(ix->OK()) << ix.Fox().Reason();
+      EXPECT_EQ(ix.Fox().Unique(), c.unique);
     }
-    delete taglist;
     Bytes b = ReadIndexFile(path);
     ASSERT_EQ(b.size(), c.size);
     ExpectBytes(b, c.header, c.head);
@@ -85,7 +80,7 @@ TEST(FoxFiles, NewFilesAreLaidOutByteForByte) {
     } else {
       ExpectBytes(b, c.header + 16, {'N', 'A', 'M', 'E', 0});
     }
-    if (tag) {
+    if (form.Tag()) {
       // The tag list: options 0xE0, an empty expression; its root leaf holds
       // the name NAME for record 1536, stored as 4 bytes and 6 trailing blanks.
       ExpectBytes(b, 0, {0, 4, 0, 0, 0, 0, 0, 0, 0, 0, 0, 0, 10, 0, 0xE0, 1});
@@ -96,13 +91,11 @@ TEST(FoxFiles, NewFilesAreLaidOutByteForByte) {
     }
     // Opening and closing without keys writes nothing.
     {
-      ZQDBFoxIndex* list = nullptr;
-      ZQDBFoxIndex again(base.c_str(), name.c_str(), list);
-      ASSERT_TRUE(again.OK()) << again.Reason();
+      Index again(form, "layout");
+      ASSERT_TRUE(again->OK()) << again.Fox().Reason();
       ZQString expr;
-      again.Expression(expr);
+      again.Fox().Expression(expr);
       EXPECT_STREQ(expr.c_str(), compact ? "name" : "NAME");
-      delete list;
     }
     EXPECT_EQ(ReadIndexFile(path), b);
   }
@@ -139,15 +132,8 @@ TEST(FoxCompactLeaf, HoldsKeysAsOtherProgramsReadThem) {
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.what);
-    KeyField f(c.width, true);
-    std::string path = ScratchPath("leaf.idx");
-    ZQDBFoxIndex* none = nullptr;
-    {
-      ZQDBFoxIndex ix("unused", path.c_str(), f.fields, f.def, none);
-      ASSERT_TRUE(ix.OK()) << ix.Reason();
-      for (size_t i = 0; i < c.keys.size(); ++i) ASSERT_TRUE(AddKey(ix, c.keys[i], int32_t(i)));
-    }
-    Bytes b = ReadIndexFile(path);
+    const Form leaf{"leaf.idx", true, true};
+    Bytes b = Made(leaf, "unused", c.width, c.keys);
     ASSERT_EQ(b.size(), 1536u);
     EXPECT_EQ(GetLe16(&b[1024 + 2]), c.keys.size());
     EXPECT_EQ(GetLe16(&b[1024 + 12]), c.freeBytes);
@@ -159,12 +145,7 @@ TEST(FoxCompactLeaf, HoldsKeysAsOtherProgramsReadThem) {
     std::vector<std::string> want = c.keys;
     for (std::string& k : want) k.resize(size_t(c.width), ' ');
     std::stable_sort(want.begin(), want.end());
-    ZQDBFoxIndex ix("unused", path.c_str(), none);
-    ASSERT_TRUE(ix.OK());
-    ZQString key;
-    std::vector<std::string> got;
-    for (int32_t r = ix.FirstKey(key); r != -1; r = ix.NextKey(key)) got.push_back(Text(key));
-    EXPECT_EQ(got, want);
+    EXPECT_EQ(WalkKeys(*Index(leaf, "unused")), want);
   }
 }
 
@@ -225,15 +206,7 @@ TEST(FoxSplit, FallsBesideARunOfEqualKeysOrInsideIt) {
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.what);
-    KeyField f(50, false);
-    std::string path = ScratchPath("split.idx");
-    ZQDBFoxIndex* none = nullptr;
-    {
-      ZQDBFoxIndex ix("unused", path.c_str(), f.fields, f.def, none);
-      ASSERT_TRUE(ix.OK());
-      for (size_t i = 0; i < c.keys.size(); ++i) ASSERT_TRUE(AddKey(ix, c.keys[i], int32_t(i)));
-    }
-    Bytes b = ReadIndexFile(path);
+    Bytes b = Made(Form{"split.idx", true, false}, "unused", 50, c.keys);
     ASSERT_EQ(b.size(), 2048u);  // one block for the new root, one for the lower half
     EXPECT_EQ(GetLe32(&b[0]), 1024u);
     ExpectBytes(b, 1024, {1, 0, 2, 0});  // the root: two entries

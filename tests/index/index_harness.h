@@ -91,6 +91,7 @@ class Index {
   Index& operator=(const Index&) = delete;
   ZQDBIndexBase* operator->() const { return ix_.get(); }
   ZQDBIndexBase& operator*() const { return *ix_; }
+  ZQDBFoxIndex& Fox() const { return static_cast<ZQDBFoxIndex&>(*ix_); }  // REQUIRES: a FoxPro form
 
  private:
   ZQDBFoxIndex* taglist_ = nullptr;
@@ -113,6 +114,14 @@ inline bool AddKey(ZQDBIndexBase& ix, const std::string& key, int32_t record) {
 
 inline std::string Text(const ZQString& s) { return std::string(s.c_str(), size_t(s.length())); }
 
+// The keys of a walk of the whole index, in key order.
+inline std::vector<std::string> WalkKeys(ZQDBIndexBase& ix) {
+  std::vector<std::string> keys;
+  ZQString key;
+  for (int32_t r = ix.FirstKey(key); r != -1; r = ix.NextKey(key)) keys.push_back(Text(key));
+  return keys;
+}
+
 // The file as the index objects see it: through the platform layer, whose
 // page cache holds what open descriptors wrote and haven't yet put on disk.
 inline Bytes ReadIndexFile(const std::string& path) {
@@ -123,6 +132,19 @@ inline Bytes ReadIndexFile(const std::string& path) {
   for (int32_t n; (n = _read(fd, chunk, sizeof chunk)) > 0;) b.insert(b.end(), chunk, chunk + n);
   _close(fd);
   return b;
+}
+
+// A new index of `form` beside the scratch table `table`, over a text key of
+// `width` bytes, with keys[i] added for record i: its file's bytes once closed.
+inline Bytes Made(const Form& form, const std::string& table, int width,
+                  const std::vector<std::string>& keys, bool unique = false) {
+  KeyField f(width, form.compress, unique);
+  {
+    Index ix(form, table, &f);
+    EXPECT_TRUE(ix->OK());
+    for (size_t i = 0; i < keys.size(); ++i) EXPECT_TRUE(AddKey(*ix, keys[i], int32_t(i))) << i;
+  }
+  return ReadIndexFile(ScratchPath(form.File(table)));
 }
 
 inline void ExpectBytes(const Bytes& b, size_t at, const std::vector<uint8_t>& want) {

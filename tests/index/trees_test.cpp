@@ -111,24 +111,21 @@ TEST(IndexTrees, HoldEveryKeyInAnyOrderOfArrival) {
   }
 }
 
-// An index of `form` beside the scratch table `table` with `n` different keys
-// of `width` bytes added in a scrambled order: its file's bytes.
-Bytes Made(const Form& form, const std::string& table, int n, int width) {
-  KeyField f(width, form.compress);
-  {
-    Index ix(form, table, &f);
-    std::vector<int32_t> order(size_t(n), 0);
-    std::iota(order.begin(), order.end(), 0);
-    std::shuffle(order.begin(), order.end(), std::mt19937(5));
-    for (int32_t r : order) EXPECT_TRUE(AddKey(*ix, Key(r, width), r));
-  }
-  return ReadIndexFile(ScratchPath(form.File(table)));
+// `n` different keys of `width` bytes in a scrambled order.
+std::vector<std::string> Scrambled(int n, int width) {
+  std::vector<int> order(size_t(n), 0);
+  std::iota(order.begin(), order.end(), 0);
+  std::shuffle(order.begin(), order.end(), std::mt19937(5));
+  std::vector<std::string> keys;
+  for (int v : order) keys.push_back(Key(v, width));
+  return keys;
 }
 
 // One number of a good file set wrong: the index is refused with its reason,
 // or every walk, search and insert ends.
 TEST(IndexDamage, IsRefusedOrEndsTheWalkNeverAHang) {
-  const Bytes ndx = Made(kNdx, "damage", 2000, 10), idx = Made(kIdx, "damage", 6000, 10);
+  const Bytes ndx = Made(kNdx, "damage", 10, Scrambled(2000, 10));
+  const Bytes idx = Made(kIdx, "damage", 10, Scrambled(6000, 10));
   const size_t nroot = GetLe32(&ndx[0]) * 512, root = GetLe32(&idx[0]);
   ASSERT_EQ(idx[root] & 2, 0);                       // the root is interior
   size_t child = GetBe32(&idx[root + 12 + 10 + 4]);  // its first child
@@ -234,7 +231,7 @@ TEST(IndexTreeCheck, FindsEachFaultOfStructureOnceAndNamesItsBlock) {
   for (const Form& form : {kMdx, kNdx, kCdx, kPlainIdx}) {
     SCOPED_TRACE(std::string(form.name) + (form.fox ? " fox" : ""));
     const int bit = form.fox ? (form.compress ? C : P) : (form.Tag() ? M : N);
-    const Tree good(Made(form, "check", n, width), form, width);
+    const Tree good(Made(form, "check", width, Scrambled(n, width)), form, width);
     // The places of the tree: the root's first two children, the first
     // leaves, their parent and depth, the first leaf below the root's last
     // child and the last leaf. The index opens along its first children, so

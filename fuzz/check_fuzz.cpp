@@ -24,11 +24,7 @@
 #include "fuzz/scratch_file.h"
 #include "host/endian.h"
 
-namespace {
-
-constexpr size_t kHead = 5;
-
-}  // namespace
+constexpr size_t kHead = 5;  // the kind and two lengths
 
 extern "C" int LLVMFuzzerInitialize(int*, char***) {
   // The module that reads the table, as built beside this target.

@@ -20,21 +20,15 @@ void MakeTable(const std::string& path, std::initializer_list<const char*> index
   tests::Target t(2, mode);
   t.Add('C', "NAME", 10);
   t.Add('N', "QTY", 5);
-  for (const char* def : indexes) {
-    std::string d = def;
-    size_t eq = d.find('=');
+  for (std::string d : indexes) {
     auto* index = new ZQIndexDef;
-    index->Name(d.substr(0, eq).c_str());
-    ASSERT_TRUE(t->ParseIndexExpression(d.substr(eq + 1).c_str(), index));
+    index->Name(d.substr(0, d.find('=')).c_str());
+    ASSERT_TRUE(t->ParseIndexExpression(d.substr(d.find('=') + 1).c_str(), index));
     t->AddIndex(index);
   }
   ASSERT_EQ(t.Open(path), 0);
   int qty = 0;
-  for (const char* name : names) {
-    t.Set(0, name);
-    t.Set(1, std::to_string(++qty).c_str());
-    ASSERT_EQ(t.Write(), 0);
-  }
+  for (const char* name : names) ASSERT_EQ(t.Put({name, std::to_string(++qty).c_str()}), 0);
   ASSERT_EQ(t.Close(), 0);
 }
 

@@ -225,17 +225,7 @@ TEST(IndexCursor, MovesOneKeyAtATimeBothWaysWhereTheKindCan) {
 }
 
 // ---------------------------------------------------------------------------
-// Damage
-
-TEST(DbaseDamage, AMissingFileOrTagIsNotOk) {
-  KeyField f(10);
-  std::string base = Base("missing");
-  EXPECT_FALSE(ZQDBMdx(base.c_str(), "NAME").OK());
-  { ZQDBMdx ix(base.c_str(), "NAME", f.fields, &f.def); }
-  EXPECT_FALSE(ZQDBMdx(base.c_str(), "OTHER").OK());
-  EXPECT_TRUE(ZQDBMdx(base.c_str(), "name").OK());  // names are found in any case
-  EXPECT_FALSE(ZQDBMdx("unused", ScratchPath("none.ndx").c_str()).OK());
-}
+// The tree check
 
 // Numeric keys are doubles: the module keeps them in the order of their
 // bytes, dBASE and libxbase64 in the order of their values; a check by

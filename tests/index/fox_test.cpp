@@ -304,21 +304,4 @@ TEST(FoxTags, BeginBelow65536) {
   delete taglist;
 }
 
-// ---------------------------------------------------------------------------
-// Damage
-
-TEST(FoxDamage, AMissingFileOrTagIsNotOk) {
-  std::string base = Table("missing");
-  ZQDBFoxIndex* taglist = nullptr;
-  EXPECT_FALSE(ZQDBFoxIndex(base.c_str(), "NAME", taglist).OK());
-  EXPECT_EQ(taglist, nullptr);
-  EXPECT_FALSE(ZQDBFoxIndex("unused", ScratchPath("none.idx").c_str(), taglist).OK());
-  KeyField wide(ZQDBFoxIndex::kMaxKeyLength + 1, true);
-  EXPECT_FALSE(ZQDBFoxIndex("unused", ScratchPath("wide.idx").c_str(), wide.fields, wide.def, taglist).OK());
-  // A CDX that is no index at all: not OK, and no tag list is kept.
-  tests::WriteScratch("missing.cdx", Bytes(100, 0x41));
-  EXPECT_FALSE(ZQDBFoxIndex(base.c_str(), "NAME", taglist).OK());
-  EXPECT_EQ(taglist, nullptr);
-}
-
 }  // namespace

@@ -21,14 +21,11 @@
 namespace tests {
 
 // The trees of a million keys run in the optimised build only.
-#if defined(__SANITIZE_ADDRESS__)
-constexpr bool kSanitized = true;
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer)
-constexpr bool kSanitized = true;
-#else
-constexpr bool kSanitized = false;
+#ifndef __has_feature
+#define __has_feature(x) 0  // GCC says __SANITIZE_ADDRESS__ instead
 #endif
+#if __has_feature(address_sanitizer) || defined(__SANITIZE_ADDRESS__)
+constexpr bool kSanitized = true;
 #else
 constexpr bool kSanitized = false;
 #endif
@@ -71,17 +68,14 @@ constexpr Form kCdx{"TREE", true, true};
 class Index {
  public:
   Index(const Form& form, const std::string& table, KeyField* key = nullptr) {
-    std::string base = ScratchPath(table);
-    std::string name = form.Tag() ? form.name : ScratchPath(form.name);
+    const std::string path = ScratchPath(table), file = form.Tag() ? form.name : ScratchPath(form.name);
+    const char *base = path.c_str(), *name = file.c_str();
     if (key != nullptr) unlink(ScratchPath(form.File(table)).c_str());
-    if (form.fox && key != nullptr)
-      ix_.reset(new ZQDBFoxIndex(base.c_str(), name.c_str(), key->fields, key->def, taglist_));
-    else if (form.fox)
-      ix_.reset(new ZQDBFoxIndex(base.c_str(), name.c_str(), taglist_));
-    else if (key != nullptr)
-      ix_.reset(new ZQDBMdx(base.c_str(), name.c_str(), key->fields, &key->def));
+    if (form.fox)
+      ix_.reset(key ? new ZQDBFoxIndex(base, name, key->fields, key->def, taglist_)
+                    : new ZQDBFoxIndex(base, name, taglist_));
     else
-      ix_.reset(new ZQDBMdx(base.c_str(), name.c_str()));
+      ix_.reset(key ? new ZQDBMdx(base, name, key->fields, &key->def) : new ZQDBMdx(base, name));
   }
   ~Index() {
     ix_.reset();

@@ -185,6 +185,27 @@ TEST(IndexDamage, IsRefusedOrEndsTheWalkNeverAHang) {
   }
 }
 
+TEST(IndexDamage, AMissingFileOrTagIsNotOk) {
+  for (const Form& form : {kNdx, kMdx, kIdx, kCdx}) {
+    unlink(ScratchPath(form.File("missing")).c_str());
+    EXPECT_FALSE(Index(form, "missing")->OK()) << form.name;
+  }
+  Made(kMdx, "missing", 10, {});
+  EXPECT_FALSE(Index(Form{"OTHER", false, false}, "missing")->OK());
+  EXPECT_TRUE(Index(Form{"tree", false, false}, "missing")->OK());  // names are found in any case
+  // A missing CDX, or one that is no index at all: not OK, and no tag list is kept.
+  const std::string base = ScratchPath("missing");
+  ZQDBFoxIndex* taglist = nullptr;
+  unlink((base + ".cdx").c_str());
+  EXPECT_FALSE(ZQDBFoxIndex(base.c_str(), "NAME", taglist).OK());
+  EXPECT_EQ(taglist, nullptr);
+  WriteScratch("missing.cdx", Bytes(100, 0x41));
+  EXPECT_FALSE(ZQDBFoxIndex(base.c_str(), "NAME", taglist).OK());
+  EXPECT_EQ(taglist, nullptr);
+  KeyField wide(ZQDBFoxIndex::kMaxKeyLength + 1, true);
+  EXPECT_FALSE(Index(kIdx, "missing", &wide)->OK());
+}
+
 // An index's tree read from its file's bytes as its form lays it out, its
 // blocks named by their number of 512-byte units as the checks name them. A
 // dBASE interior block has n keys and n + 1 children, the last where entry n

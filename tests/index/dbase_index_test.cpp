@@ -38,12 +38,9 @@ uint32_t Le32At(const Bytes& b, size_t at) { return GetLe32(&b[at]); }
 
 TEST(IndexExpression, CompilesTheGrammarAndRefusesTheRest) {
   Fields f;
-  struct Case {
-    const char* text;
-    int segs;              // -1: refused
-    int offset0, length0;  // of the first segment
-    bool binary0;          // the first segment makes an 8-byte double
-  } cases[] = {
+  // The segments (-1: refused); the first one's offset and length, and
+  // whether it makes an 8-byte double.
+  struct Case { const char* text; int segs, offset0, length0; bool binary0; } cases[] = {
       {"", 0, 0, 0, false},                    {"NAME+CITY", 2, 0, 10, false},
       {"NAME + CITY", 2, 0, 10, false},        {"NAME CITY", 2, 0, 10, false},
       {"name", 1, 0, 10, false},               {"substr(NAME,1,3)", 1, 1, 3, false},
@@ -188,10 +185,10 @@ TEST(MdxFile, RefusesWhatWouldShiftItsFields) {
 // The split point: equal keys stay on one side where a run ends near the
 // middle, and a run over the whole middle is split there.
 TEST(MdxFile, SplitsBesideRunsOfEqualKeysOrInsideThem) {
-  struct Case {
-    const char* keys;  // one letter per key, in record order
-    uint32_t left;     // keys in the left part once the ninth is in
-  } cases[] = {{"AABBBBCDE", 6}, {"ABCCCCCCD", 5}, {"CCCCCCCCC", 6}};
+  // One letter per key, in record order; the keys in the left part once the
+  // ninth is in.
+  struct Case { const char* keys; uint32_t left; } cases[] = {
+      {"AABBBBCDE", 6}, {"ABCCCCCCD", 5}, {"CCCCCCCCC", 6}};
   for (const Case& c : cases) {
     SCOPED_TRACE(c.keys);
     std::vector<std::string> keys;  // entries of 124 bytes: 8 keys in a node
@@ -237,7 +234,8 @@ TEST(DbaseTreeCheck, JudgesDoubleKeysByTheirBytesOrByTheirValues) {
   // One leaf at block 1: 2.0, 3.0, 1.0, entries of 16 bytes from offset 516.
   Bytes bytes = Made(ndx, "unused", 8, keys);
   Bytes values = bytes;
-  std::rotate(values.begin() + 516, values.begin() + 516 + 32, values.begin() + 516 + 48);  // 1.0, 2.0, 3.0
+  // 1.0, 2.0, 3.0
+  std::rotate(values.begin() + 516, values.begin() + 516 + 32, values.begin() + 516 + 48);
   for (const Bytes* file : {&bytes, &values}) {
     WriteScratch("values.ndx", *file);
     Index ix(ndx, "unused");

@@ -25,14 +25,15 @@ std::string Table(const std::string& name) {
 // New files
 
 TEST(FoxFiles, NewFilesAreLaidOutByteForByte) {
+  // A name with an extension is an IDX file, else a CDX tag; the file's size,
+  // where the index's header and root lie, its first 16 bytes and the root's
+  // first 24.
   struct Case {
-    const char* name;  // with an extension an IDX file, else a CDX tag
+    const char* name;
     int width;
     bool compress, unique, numeric;
-    size_t size;
-    size_t header, root;                 // where the index's header and root lie
-    std::vector<uint8_t> head;           // its first 16 bytes
-    std::vector<uint8_t> leaf;           // the root's first 24 bytes
+    size_t size, header, root;
+    std::vector<uint8_t> head, leaf;
   } cases[] = {
       // Compact, key length 7: 3 entry bytes, 18 record bits, 3 count bits.
       {"k7.idx", 7, true, false, false, 1536, 0, 1024,
@@ -109,13 +110,15 @@ TEST(FoxFiles, NewFilesAreLaidOutByteForByte) {
 // the key whole; a duplicate count never reaches into the previous key's
 // trailing blanks (a reader may fill those with NULs).
 TEST(FoxCompactLeaf, HoldsKeysAsOtherProgramsReadThem) {
+  // The keys, added as records 1, 2, ...; the leaf's free bytes, its entries,
+  // and the packed key bytes at the end of the block.
   struct Case {
     const char* what;
     int width;
-    std::vector<std::string> keys;  // added as records 1, 2, ...
+    std::vector<std::string> keys;
     int freeBytes;
     std::vector<uint8_t> entries;
-    std::string stored;  // the packed key bytes at the end of the block
+    std::string stored;
   } cases[] = {
       {"a first key of full length", 10, {"ABCDEFGHIJ"}, 475, {1, 0, 0}, "ABCDEFGHIJ"},
       {"a key sharing all but its last byte", 10, {"ABCDEFGHIJ", "ABCDEFGHIX"}, 471,
@@ -138,9 +141,9 @@ TEST(FoxCompactLeaf, HoldsKeysAsOtherProgramsReadThem) {
     EXPECT_EQ(GetLe16(&b[1024 + 2]), c.keys.size());
     EXPECT_EQ(GetLe16(&b[1024 + 12]), c.freeBytes);
     ExpectBytes(b, 1024 + 24, c.entries);
-    size_t gap = 1024 + 24 + c.entries.size();
-    EXPECT_TRUE(std::all_of(b.begin() + long(gap), b.end() - long(c.stored.size()), [](uint8_t x) { return x == 0; }));
-    EXPECT_EQ(std::string(b.end() - long(c.stored.size()), b.end()), c.stored);
+    // Zeros from the end of the entries up to the stored keys.
+    std::string tail(b.begin() + long(1024 + 24 + c.entries.size()), b.end());
+    EXPECT_EQ(tail, std::string(tail.size() - c.stored.size(), '\0') + c.stored);
     // Read back whole, blank-filled, in key order.
     std::vector<std::string> want = c.keys;
     for (std::string& k : want) k.resize(size_t(c.width), ' ');
@@ -152,38 +155,34 @@ TEST(FoxCompactLeaf, HoldsKeysAsOtherProgramsReadThem) {
 // A leaf whose record numbers outgrow its record bits takes wider entries,
 // then fewer count bits, and never cuts a record number.
 TEST(FoxCompactLeaf, WidensItsRecordBitsSoAnyRecordFits) {
-  struct Step {
-    int32_t record;  // from 0
-    uint8_t recordBits, countBits, entryBytes;
-  } steps[] = {
+  // The last record added (from 0), and the leaf's widths then.
+  struct Step { int32_t record; uint8_t recordBits, countBits, entryBytes; } steps[] = {
       {65534, 16, 4, 3},        // record 65,535: the widths by key length
       {65535, 24, 4, 4},        // 65,536: four entry bytes
       {20000000, 26, 3, 4},     // beyond 2^24: fewer count bits
       {2000000000, 32, 0, 4},   // beyond 2^30: record numbers alone
   };
   KeyField f(10, true);
-  std::string path = ScratchPath("wide.idx");
-  ZQDBFoxIndex* none = nullptr;
+  const Form wide{"wide.idx", true, true};
   std::vector<int32_t> records;
   {
-    ZQDBFoxIndex ix("unused", path.c_str(), f.fields, f.def, none);
-    ASSERT_TRUE(ix.OK());
+    Index ix(wide, "unused", &f);
+    ASSERT_TRUE(ix->OK());
     for (const Step& s : steps) {
       SCOPED_TRACE(s.record);
       for (int32_t r = s.record - 4; r <= s.record; ++r) {  // up to the step's record
-        ASSERT_TRUE(AddKey(ix, Key(r % 1000, 10), r));
+        ASSERT_TRUE(AddKey(*ix, Key(r % 1000, 10), r));
         records.push_back(r);
       }
-      ASSERT_TRUE(ix.Flush());
-      Bytes b = ReadIndexFile(path);
+      ASSERT_TRUE(ix.Fox().Flush());
+      Bytes b = ReadIndexFile(ScratchPath(wide.name));
       ExpectBytes(b, 1024 + 20, {s.recordBits, s.countBits, s.countBits, s.entryBytes});
     }
   }
-  ZQDBFoxIndex ix("unused", path.c_str(), none);
-  ASSERT_TRUE(ix.OK());
+  Index ix(wide, "unused");
   ZQString key;
   std::vector<int32_t> got;
-  for (int32_t r = ix.FirstKey(key); r != -1; r = ix.NextKey(key)) got.push_back(r);
+  for (int32_t r = ix->FirstKey(key); r != -1; r = ix->NextKey(key)) got.push_back(r);
   std::sort(got.begin(), got.end());
   std::sort(records.begin(), records.end());
   EXPECT_EQ(got, records);
@@ -195,11 +194,8 @@ TEST(FoxCompactLeaf, WidensItsRecordBitsSoAnyRecordFits) {
 // A non-compact leaf of key length 50 holds 9 keys; the tenth splits the
 // root (a new root at 1024) and then the old root (its lower half to 1536).
 TEST(FoxSplit, FallsBesideARunOfEqualKeysOrInsideIt) {
-  struct Case {
-    const char* what;
-    std::vector<std::string> keys;  // nine, then the tenth
-    int lower, upper;               // keys in the blocks at 1536 and 512
-  } cases[] = {
+  // Nine keys, then the tenth; the keys in the blocks at 1536 and 512.
+  struct Case { const char* what; std::vector<std::string> keys; int lower, upper; } cases[] = {
       {"key 5 differs from key 4: five keys below", {"A0", "A1", "A2", "A3", "A4", "A5", "A6", "A7", "A8", "Z"}, 5, 5},
       {"key 5 equals key 4, key 3 differs: four below", {"A0", "A1", "A2", "A3", "A4", "A4", "A6", "A7", "A8", "Z"}, 4, 6},
       {"all equal: split at n / 2, the run in both", {"A", "A", "A", "A", "A", "A", "A", "A", "A", "A"}, 5, 5},
@@ -229,11 +225,8 @@ TEST(FoxTags, AreAddedFoundInAnyCaseAndListed) {
   t.Add('C', "CITY", 4);
   std::string base = Table("tags");
   ZQDBFoxIndex* taglist = nullptr;
-  struct NewTag {
-    const char* tag;
-    const char* field;  // a field of the table, or one it lacks
-    bool made;
-  } tags[] = {
+  // The tag, the field its key is over (one the table has, or not), whether it is made.
+  struct NewTag { const char *tag, *field; bool made; } tags[] = {
       {"LONGERNAME", "NAME", true},
       {"AB", "CITY", true},           // comes back without the tail of LONGERNAME
       {"ORPHAN", "GONE", true},       // its expression names no field of the table

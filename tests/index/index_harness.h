@@ -68,7 +68,8 @@ constexpr Form kCdx{"TREE", true, true};
 class Index {
  public:
   Index(const Form& form, const std::string& table, KeyField* key = nullptr) {
-    const std::string path = ScratchPath(table), file = form.Tag() ? form.name : ScratchPath(form.name);
+    const std::string path = ScratchPath(table);
+    const std::string file = form.Tag() ? form.name : ScratchPath(form.name);
     const char *base = path.c_str(), *name = file.c_str();
     if (key != nullptr) unlink(ScratchPath(form.File(table)).c_str());
     if (form.fox)

@@ -42,7 +42,7 @@ void CheckWalk(ZQDBIndexBase& ix, const Form& form, const std::vector<std::strin
   }
   ASSERT_EQ(count, form.Backwards() ? 0 : n);
   const int32_t searched = form.fox ? 8 : int32_t(keyOf[0].size());
-  for (size_t i = 0; i < n; i += 1 + n / 997) {
+  for (size_t i = 0; i < n; i += 2 + n / 997) {  // a step prime to 7: every run is sampled
     int32_t r = ix.FindKey(ZQString(keyOf[i].data(), searched), true);
     ASSERT_NE(r, -1) << keyOf[i];
     ASSERT_EQ(keyOf[size_t(r)], keyOf[i]);
@@ -60,12 +60,7 @@ TEST(IndexTrees, HoldEveryKeyInAnyOrderOfArrival) {
   // every kind of split; the large ones run in the optimised build.
   enum Keys { kRuns, kFallingRuns, kRandom, kCycle, kUnique };
   enum Arrival { kRising, kFalling, kShuffled };
-  struct Run {
-    Form form;
-    Keys keys;
-    Arrival arrival;
-    int width, n;
-  };
+  struct Run { Form form; Keys keys; Arrival arrival; int width, n; };
   const int n = kSanitized ? 20000 : 100000, m = 1000000;
   std::vector<Run> runs = {
       {kMdx, kCycle, kRising, 10, n},     {kMdx, kCycle, kFalling, 10, n},
@@ -89,8 +84,8 @@ TEST(IndexTrees, HoldEveryKeyInAnyOrderOfArrival) {
     std::vector<std::string> keyOf(size_t(run.n));
     std::mt19937 random(11);
     for (int r = 0; r < run.n; ++r) {
-      const int values[] = {r / 7, (run.n - 1 - r) / 7, int(random() % uint32_t(run.n / 2)), r % 7, r};
-      keyOf[size_t(r)] = Key(values[run.keys], run.width);
+      const int v[] = {r / 7, (run.n - 1 - r) / 7, int(random() % uint32_t(run.n / 2)), r % 7, r};
+      keyOf[size_t(r)] = Key(v[run.keys], run.width);
     }
     std::vector<int32_t> records(keyOf.size());
     std::iota(records.begin(), records.end(), 0);
@@ -131,13 +126,8 @@ TEST(IndexDamage, IsRefusedOrEndsTheWalkNeverAHang) {
   size_t child = GetBe32(&idx[root + 12 + 10 + 4]);  // its first child
   size_t leaf = child;
   while ((idx[leaf] & 2) == 0) leaf = GetBe32(&idx[leaf + 12 + 10 + 4]);
-  struct Case {
-    const Form* form;
-    const char* what;
-    size_t at;
-    uint32_t value;
-    int width;  // bytes, little-endian (-4: big-endian)
-  } cases[] = {
+  // At `at` the number `to` of `size` bytes, little-endian (-4: big-endian).
+  struct Case { const Form* form; const char* what; size_t at; uint32_t to; int size; } cases[] = {
       {&kNdx, "root past the end", 0, 99999, 4}, {&kNdx, "root in the header", 0, 0, 4},
       {&kNdx, "key length 0", 12, 0, 2}, {&kNdx, "key length beyond a block", 12, 600, 2},
       {&kNdx, "entry size below the key", 18, 8, 2},
@@ -163,10 +153,10 @@ TEST(IndexDamage, IsRefusedOrEndsTheWalkNeverAHang) {
   for (const Case& c : cases) {
     SCOPED_TRACE(std::string(c.form->name) + ": " + c.what);
     Bytes bad = c.form->fox ? idx : ndx;
-    if (c.width == 4) PutLe32(&bad[c.at], c.value);
-    else if (c.width == -4) PutBe32(&bad[c.at], c.value);
-    else if (c.width == 2) PutLe16(&bad[c.at], uint16_t(c.value));
-    else bad[c.at] = uint8_t(c.value);
+    if (c.size == 4) PutLe32(&bad[c.at], c.to);
+    else if (c.size == -4) PutBe32(&bad[c.at], c.to);
+    else if (c.size == 2) PutLe16(&bad[c.at], uint16_t(c.to));
+    else bad[c.at] = uint8_t(c.to);
     WriteScratch(c.form->name, bad);
     Index ix(*c.form, "damage");
     if (!ix->OK()) {
@@ -227,7 +217,9 @@ struct Tree {
     }
     room = ((mdx ? 1024 : 512) - header - 4) / entry;
   }
-  uint32_t Count(uint32_t blk) const { return fox ? GetLe16(&b[blk * 512 + 2]) : GetLe32(&b[blk * 512]); }
+  uint32_t Count(uint32_t blk) const {
+    return fox ? GetLe16(&b[blk * 512 + 2]) : GetLe32(&b[blk * 512]);
+  }
   void SetCount(uint32_t blk, uint32_t n) {
     if (fox) PutLe16(&b[blk * 512 + 2], uint16_t(n));
     else PutLe32(&b[blk * 512], n);
@@ -242,7 +234,9 @@ struct Tree {
     if (fox) PutBe32(&b[ChildAt(blk, i)], v * 512);
     else PutLe32(&b[ChildAt(blk, i)], v);
   }
-  bool Leaf(uint32_t blk) const { return fox ? (b[blk * 512] & 2) != 0 : Child(blk, mdx ? Count(blk) : 0) == 0; }
+  bool Leaf(uint32_t blk) const {
+    return fox ? (b[blk * 512] & 2) != 0 : Child(blk, mdx ? Count(blk) : 0) == 0;
+  }
   uint8_t* Key(uint32_t blk, uint32_t i) { return &b[Entry(blk, i) + keyAt]; }
 };
 
@@ -253,28 +247,30 @@ TEST(IndexTreeCheck, FindsEachFaultOfStructureOnceAndNamesItsBlock) {
     SCOPED_TRACE(std::string(form.name) + (form.fox ? " fox" : ""));
     const int bit = form.fox ? (form.compress ? C : P) : (form.Tag() ? M : N);
     const Tree good(Made(form, "check", width, Scrambled(n, width)), form, width);
-    // The places of the tree: the root's first two children, the first
-    // leaves, their parent and depth, the first leaf below the root's last
-    // child and the last leaf. The index opens along its first children, so
+    // The places of the tree: the root R and its first two children, the
+    // first leaves L0-L2, their parent Pa and depth, the first leaf LF below
+    // the root's last child and the last leaf LN. The index opens along its first children, so
     // the damage that would stop that lies beside them.
     const uint32_t R = good.root, X0 = good.Child(R, 0), X1 = good.Child(R, 1);
     uint32_t Pa = R, depth = 1;
     while (!good.Leaf(good.Child(Pa, 0))) Pa = good.Child(Pa, 0), ++depth;
     const uint32_t L0 = good.Child(Pa, 0), L1 = good.Child(Pa, 1), L2 = good.Child(Pa, 2);
-    uint32_t lastFirst = good.Child(R, good.Last(R)), lastLeaf = R;
-    while (!good.Leaf(lastFirst)) lastFirst = good.Child(lastFirst, 0);
-    while (!good.Leaf(lastLeaf)) lastLeaf = good.Child(lastLeaf, good.Last(lastLeaf));
+    uint32_t LF = good.Child(R, good.Last(R)), LN = R;
+    while (!good.Leaf(LF)) LF = good.Child(LF, 0);
+    while (!good.Leaf(LN)) LN = good.Child(LN, good.Last(LN));
     ASSERT_GE(depth, 2u);
     auto blk = [](uint32_t v) { return "block " + std::to_string(v); };
     auto num = [](uint32_t v) { return std::to_string(v); };
     auto link = [](Tree& t, uint32_t at, uint32_t to) { PutLe32(&t.b[at], to * 512); };
     const uint32_t XL = good.Child(X0, 1), off = X1 * 512 + 3;  // X0's second child; an odd offset
+    // The forms damaged so, the damage, the block the finding names and what
+    // it says of it (empty: no finding).
     struct Case {
       const char* what;
       int forms;
       std::function<void(Tree&)> damage;
-      uint32_t block;    // the block the finding names
-      std::string says;  // what it says of it; empty: no finding
+      uint32_t block;
+      std::string says;
     } cases[] = {
         {"nothing", All, [](Tree&) {}, 0, ""},
         {"a child that is its own parent", All, [&](Tree& t) { t.SetChild(X1, 0, R); }, R,
@@ -283,18 +279,19 @@ TEST(IndexTreeCheck, FindsEachFaultOfStructureOnceAndNamesItsBlock) {
          "reached a second time (from " + blk(X0) + " and " + blk(X1) + ")"},
         {"a key count the block can't hold", All, [&](Tree& t) { t.SetCount(L1, 5000); }, L1,
          "holds 5000 keys, more than the" + (form.fox ? "" : " " + num(good.room))},
-        {"an empty leaf below the root", N | M, [&](Tree& t) { t.SetCount(L1, 0), t.SetChild(L1, 0, 0); },
-         L1, "an empty leaf below the root"},
+        {"an empty leaf below the root", N | M,
+         [&](Tree& t) { t.SetCount(L1, 0), t.SetChild(L1, 0, 0); }, L1,
+         "an empty leaf below the root"},
         {"an interior block with no keys", P | C, [&](Tree& t) { t.SetCount(X1, 0); }, X1,
          "an interior block with no keys"},
-        {"a level skipped", All, [&](Tree& t) { t.SetChild(R, t.Last(R), lastFirst); }, lastFirst,
+        {"a level skipped", All, [&](Tree& t) { t.SetChild(R, t.Last(R), LF); }, LF,
          "a leaf 1 level below the root, where the first leaf lies " + num(depth) + " levels"},
         {"a right sibling link wrong", P | C, [&](Tree& t) { link(t, L0 * 512 + 8, L2); }, L0,
          "its right sibling is " + blk(L2) + ", where the block after it at its level is " + blk(L1)},
         {"a first block with a left sibling", P | C, [&](Tree& t) { link(t, L0 * 512 + 4, L1); }, L0,
          "its left sibling is " + blk(L1) + ", where it is the first block of its level"},
-        {"a last block with a right sibling", P | C, [&](Tree& t) { link(t, lastLeaf * 512 + 8, L0); },
-         lastLeaf, "its right sibling is " + blk(L0) + ", where it is the last block of its level"},
+        {"a last block with a right sibling", P | C, [&](Tree& t) { link(t, LN * 512 + 8, L0); },
+         LN, "its right sibling is " + blk(L0) + ", where it is the last block of its level"},
         {"a child past the end", All, [&](Tree& t) { t.SetChild(R, 1, 4194303); }, R,
          "names block 4194303, which lies past the end"},
         {"a child in the header", All, [&](Tree& t) { t.SetChild(R, 1, 0); }, R,
@@ -302,7 +299,8 @@ TEST(IndexTreeCheck, FindsEachFaultOfStructureOnceAndNamesItsBlock) {
                   : "names block 0, which lies in the file's header"},
         {"a child off a block boundary", M, [&](Tree& t) { t.SetChild(R, 1, X1 + 1); }, R,
          "entry 1 names " + blk(X1 + 1) + ", which is not on a block boundary"},
-        {"a child off a block boundary", P | C, [&](Tree& t) { PutBe32(&t.b[t.ChildAt(R, 1)], off); }, R,
+        {"a child off a block boundary", P | C,
+         [&](Tree& t) { PutBe32(&t.b[t.ChildAt(R, 1)], off); }, R,
          "entry 1 names offset " + num(off) + ", which is not on a 512-byte block boundary"},
         {"keys out of order in a leaf", N | M | P,
          [&](Tree& t) { std::swap_ranges(t.Key(L1, 0), t.Key(L1, 0) + width, t.Key(L1, 1)); }, L1,
@@ -318,8 +316,8 @@ TEST(IndexTreeCheck, FindsEachFaultOfStructureOnceAndNamesItsBlock) {
         {"a block count below the tree's", M, [](Tree& t) { PutLe32(&t.b[4 * 512 + 4], 2); }, 4,
          "the tag header counts 2 units of blocks, fewer than"},
         // Tolerated, as Perl XBase writes them: no finding.
-        {"a root's links of 0", P | C, [&](Tree& t) { link(t, R * 512 + 4, 0), link(t, R * 512 + 8, 0); },
-         0, ""},
+        {"a root's links of 0", P | C,
+         [&](Tree& t) { link(t, R * 512 + 4, 0), link(t, R * 512 + 8, 0); }, 0, ""},
         {"an interior key filled with NUL bytes", P | C,
          [&](Tree& t) { memset(t.Key(Pa, 0) + 8, 0, size_t(width - 8)); }, 0, ""},
     };

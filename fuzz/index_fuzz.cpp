@@ -10,6 +10,7 @@
 #include <cstdint>
 #include <cstdio>
 #include <cstring>
+#include <memory>
 #include <string>
 
 #include "fuzz/scratch_file.h"
@@ -59,17 +60,13 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   const std::string base = fuzz::ScratchDir("indexfuzz") + "/t", path = base + ext[kind];
   if (!fuzz::WriteScratch(path, data + 1, size - 1)) return 0;
   ZQDBFoxIndex* taglist = nullptr;
-  if (kind == 0) {
-    ZQDBMdx ix(base.c_str(), path.c_str());
-    Exercise(ix);
-  } else if (kind == 1) {
-    char name[12] = "NAME";  // the first tag's name, as the file gives it
+  if (kind < 3) {
+    char name[12] = "NAME";  // an MDX file's first tag, as the file names it
     if (size > 1 + 548 + 11) memcpy(name, data + 1 + 548, 11);
-    ZQDBMdx ix(base.c_str(), name);
-    Exercise(ix);
-  } else if (kind == 2) {
-    ZQDBFoxIndex ix(base.c_str(), path.c_str(), taglist);
-    Exercise(ix);
+    std::unique_ptr<ZQDBIndexBase> ix;
+    if (kind == 2) ix.reset(new ZQDBFoxIndex(base.c_str(), path.c_str(), taglist));
+    else ix.reset(new ZQDBMdx(base.c_str(), kind == 0 ? path.c_str() : name));
+    Exercise(*ix);
   } else {
     // The tags the list names, each opened through the list and walked.
     std::string names[kMaxTags];

@@ -235,12 +235,8 @@ TEST(FoxTags, AreAddedFoundInAnyCaseAndListed) {
   };
   for (const NewTag& n : tags) {
     SCOPED_TRACE(n.tag);
-    ZQRecord fields;
-    ZQDType text(DT_TEXT);
-    text.Length(10);
-    ZQIndexDef def;
-    def.AddSeg(0, 10, &text, fields.NewField(text, n.field));
-    ZQDBFoxIndex ix(base.c_str(), n.tag, fields, def, taglist);
+    KeyField f(10, true, false, false, n.field);
+    ZQDBFoxIndex ix(base.c_str(), n.tag, f.fields, f.def, taglist);
     ASSERT_EQ(ix.OK(), n.made) << ix.Reason();
     ASSERT_NE(taglist, nullptr);
   }

@@ -30,16 +30,17 @@ constexpr bool kSanitized = true;
 constexpr bool kSanitized = false;
 #endif
 
-// The key of a new index: one field NAME of `width` bytes, text or (numeric)
-// an 8-byte double key.
+// The key of a new index: one field `name` of `width` bytes, text or
+// (numeric) an 8-byte double key.
 struct KeyField {
   ZQRecord fields;
   ZQIndexDef def;
   ZQDType type;
-  explicit KeyField(int width, bool compress = true, bool unique = false, bool numeric = false)
+  explicit KeyField(int width, bool compress = true, bool unique = false, bool numeric = false,
+                    const char* name = "NAME")
       : type(numeric ? DT_DOUBLE : DT_TEXT) {
     type.Length(width);
-    def.AddSeg(0, int16_t(numeric ? 8 : width), &type, fields.NewField(type, "NAME"));
+    def.AddSeg(0, int16_t(numeric ? 8 : width), &type, fields.NewField(type, name));
     def.Name("NAME");
     def.Compress(compress);
     def.Dups(!unique);
@@ -148,11 +149,7 @@ inline void ExpectBytes(const Bytes& b, size_t at, const std::vector<uint8_t>& w
 }
 
 // Little-endian numbers of 1, 2 or 4 bytes at their offsets.
-struct Word {
-  size_t at;
-  int size;
-  uint32_t value;
-};
+struct Word { size_t at; int size; uint32_t value; };
 inline void ExpectWords(const Bytes& b, std::initializer_list<Word> words) {
   for (const Word& w : words) {
     ASSERT_LE(w.at + size_t(w.size), b.size());

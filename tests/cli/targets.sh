@@ -4,11 +4,9 @@
 source "$(dirname "$0")/lib.bash" "$1"
 cd "$WORK" || exit 1
 make_table t.dbf
-expect_run 0 convert t.dbf -
-same "CSV on standard output" "$(tr -d '\r' <"$OUT")" "NAME,QTY
-alice,42"
+# (What "-" takes, CSV and JSON lines, is checked in csv_input.sh.)
+expect_run 0 convert t.dbf - && expect_out "alice,42"
 absent ./-
-expect_run 0 convert t.dbf - --format jsonl && same "JSON lines on standard output" "$(cat "$OUT")" '{"NAME":"alice","QTY":42}'
 expect_run 2 convert t.dbf - --to 4 && expect_err "zqdb: a table can't be written to standard output"
 expect_run 2 convert t.dbf - --format table
 

@@ -25,7 +25,6 @@
 
 import os
 import random
-import shutil
 import struct
 import sys
 
@@ -122,8 +121,6 @@ def numeric_keys(d):
         table = convert(d, "num", NUMBERS, "--schema", "ID N(3), K N(10,2)", "--index", "NK=K",
                         "--index", ndx + "=K")
         want = sorted((struct.pack("<d", v).hex(), r) for r, v in enumerate(NUMBERS, 1))
-        s.check("numeric order is not value order", [struct.unpack("<d", bytes.fromhex(k))[0] for k, _ in want]
-                != sorted(NUMBERS))
         for index, tag in ((ndx, ""), (table[:-4] + ".mdx", "NK")):
             zq = [(struct.pack("<d", float(k)).hex(), r) for k, r in zq_keys(table, tag or index)]
             s.check("numeric zqdb walk " + (tag or "NDX"), zq == want, repr(zq))
@@ -224,9 +221,6 @@ def stale(d):
                          {30 + i: "new%d" % i for i in range(1, 21)})
 
 
-if shutil.which("perl") is None:
-    print("index_dbase: perl missing")
-    sys.exit(1)
 with workdir() as d:
     xbase64 = xbase64_tool(d)
     character_trees(d, xbase64)

@@ -25,12 +25,6 @@ struct Fields {
   ZQSpoke* spoke() { return t.operator->(); }
 };
 
-std::string Base(const std::string& name) {
-  std::string base = ScratchPath(name);
-  _unlink((base + ".mdx").c_str());
-  return base;
-}
-
 uint32_t Le32At(const Bytes& b, size_t at) { return GetLe32(&b[at]); }
 
 // ---------------------------------------------------------------------------
@@ -153,7 +147,8 @@ TEST(MdxFile, TheRootMovesAndTheHeadersFollowAtClose) {
 }
 
 TEST(MdxFile, TagsAreLinkedIntoANameTree) {
-  std::string base = Base("tree");
+  const std::string base = ScratchPath("tree");
+  unlink((base + ".mdx").c_str());
   for (const char* name : {"M", "C", "T"}) {
     KeyField f(10);
     ZQDBMdx ix(base.c_str(), name, f.fields, &f.def);
@@ -168,7 +163,8 @@ TEST(MdxFile, TagsAreLinkedIntoANameTree) {
 }
 
 TEST(MdxFile, RefusesWhatWouldShiftItsFields) {
-  std::string base = Base("limits");
+  const std::string base = ScratchPath("limits");
+  unlink((base + ".mdx").c_str());
   KeyField f(10);
   EXPECT_FALSE(ZQDBMdx(base.c_str(), "ELEVENCHARS", f.fields, &f.def).OK());
   ZQRecord empty;

@@ -88,6 +88,7 @@ class Index {
   ZQDBIndexBase* operator->() const { return ix_.get(); }
   ZQDBIndexBase& operator*() const { return *ix_; }
   ZQDBFoxIndex& Fox() const { return static_cast<ZQDBFoxIndex&>(*ix_); }  // REQUIRES: a FoxPro form
+  const ZQDBFoxIndex* TagList() const { return taglist_; }
 
  private:
   ZQDBFoxIndex* taglist_ = nullptr;
@@ -109,14 +110,6 @@ inline bool AddKey(ZQDBIndexBase& ix, const std::string& key, int32_t record) {
 }
 
 inline std::string Text(const ZQString& s) { return std::string(s.c_str(), size_t(s.length())); }
-
-// The keys of a walk of the whole index, in key order.
-inline std::vector<std::string> WalkKeys(ZQDBIndexBase& ix) {
-  std::vector<std::string> keys;
-  ZQString key;
-  for (int32_t r = ix.FirstKey(key); r != -1; r = ix.NextKey(key)) keys.push_back(Text(key));
-  return keys;
-}
 
 // The file as the index objects see it: through the platform layer, whose
 // page cache holds what open descriptors wrote and haven't yet put on disk.

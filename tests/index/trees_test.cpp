@@ -176,22 +176,21 @@ TEST(IndexDamage, IsRefusedOrEndsTheWalkNeverAHang) {
 }
 
 TEST(IndexDamage, AMissingFileOrTagIsNotOk) {
+  // Not OK, and a CDX that is missing keeps no tag list.
   for (const Form& form : {kNdx, kMdx, kIdx, kCdx}) {
     unlink(ScratchPath(form.File("missing")).c_str());
-    EXPECT_FALSE(Index(form, "missing")->OK()) << form.name;
+    Index ix(form, "missing");
+    EXPECT_FALSE(ix->OK()) << form.name;
+    EXPECT_EQ(ix.TagList(), nullptr);
   }
   Made(kMdx, "missing", 10, {});
   EXPECT_FALSE(Index(Form{"OTHER", false, false}, "missing")->OK());
   EXPECT_TRUE(Index(Form{"tree", false, false}, "missing")->OK());  // names are found in any case
-  // A missing CDX, or one that is no index at all: not OK, and no tag list is kept.
-  const std::string base = ScratchPath("missing");
-  ZQDBFoxIndex* taglist = nullptr;
-  unlink((base + ".cdx").c_str());
-  EXPECT_FALSE(ZQDBFoxIndex(base.c_str(), "NAME", taglist).OK());
-  EXPECT_EQ(taglist, nullptr);
+  // A CDX that is no index at all: not OK, and no tag list is kept.
   WriteScratch("missing.cdx", Bytes(100, 0x41));
-  EXPECT_FALSE(ZQDBFoxIndex(base.c_str(), "NAME", taglist).OK());
-  EXPECT_EQ(taglist, nullptr);
+  Index junk(kCdx, "missing");
+  EXPECT_FALSE(junk->OK());
+  EXPECT_EQ(junk.TagList(), nullptr);
   KeyField wide(ZQDBFoxIndex::kMaxKeyLength + 1, true);
   EXPECT_FALSE(Index(kIdx, "missing", &wide)->OK());
 }

@@ -13,44 +13,29 @@ import struct
 OUT = os.path.join(os.path.dirname(os.path.abspath(__file__)), "corpus", "read")
 
 
-def wide(version, fields, records, count=None, extra=0, end_mark=True):
+def table(version, fields, records, count=None, extra=0, end_mark=True, narrow=False):
     """fields: (name, type, length, decimals); records: bytes with flag."""
     reclen = 1 + sum(f[2] for f in fields)
-    hdrlen = 32 + 32 * len(fields) + 1 + extra
     n = len(records) if count is None else count
-    out = bytearray(struct.pack("<BBBBIHH", version, 124, 1, 2, n, hdrlen, reclen))
-    out += bytes(20)
+    if narrow:
+        out = bytearray(struct.pack("<BHBBBH", version, n, 1, 24, 2, reclen))
+        size, length_at, decimals_at = 16, 12, 15
+    else:
+        hdrlen = 32 + 32 * len(fields) + 1 + extra
+        out = bytearray(struct.pack("<BBBBIHH", version, 124, 1, 2, n, hdrlen, reclen)) + bytes(20)
+        size, length_at, decimals_at = 32, 16, 17
     for name, typ, length, dec in fields:
-        d = bytearray(32)
+        d = bytearray(size)
         d[0:len(name)] = name.encode()
         d[11] = ord(typ)
-        d[16] = length
-        d[17] = dec
-        out += d
-    out += b"\x0d" + bytes(extra)
-    for r in records:
-        out += r
-    if end_mark:
-        out += b"\x1a"
-    return bytes(out)
-
-
-def narrow(version, fields, records):
-    reclen = 1 + sum(f[2] for f in fields)
-    out = bytearray(struct.pack("<BHBBBH", version, len(records), 1, 24, 2, reclen))
-    for name, typ, length, dec in fields:
-        d = bytearray(16)
-        d[0:len(name)] = name.encode()
-        d[11] = ord(typ)
-        d[12] = length
-        d[15] = dec
+        d[length_at] = length
+        d[decimals_at] = dec
         out += d
     out += b"\x0d"
-    first = 521 if len(fields) <= 32 else 16 * len(fields) + 9
-    out += bytes(first - len(out))
-    for r in records:
-        out += r
-    return bytes(out + b"\x1a")
+    if narrow:  # room for 32 descriptors, or the terminator last
+        out += bytes((521 if len(fields) <= 32 else 16 * len(fields) + 9) - len(out))
+    out += bytes(extra) + b"".join(records)
+    return bytes(out + (b"\x1a" if end_mark else b""))
 
 
 def rec(*parts, live=True):
@@ -70,17 +55,18 @@ PLAIN_ROWS = [
 
 
 def seeds():
-    yield "dbase3.dbf", wide(0x03, PLAIN, PLAIN_ROWS)
-    yield "dbase4_memo.dbf", wide(0x8B, PLAIN + [("NOTE", "M", 10, 0)],
-                                  [r + text("         1", 10) for r in PLAIN_ROWS])
-    yield "dbase3_memo.dbf", wide(0x83, [("NOTE", "M", 10, 0), ("ID", "N", 3, 0)],
-                                  [rec(text("         1", 10), text("  1", 3))])
-    yield "foxpro.dbf", wide(0xF5, PLAIN + [("PIC", "G", 10, 0)], [r + text("", 10) for r in PLAIN_ROWS])
-    yield "clipper_smt.dbf", wide(0xE5, [("NOTE", "M", 10, 0)],
-                                  [rec(b"\x00\x00" + struct.pack("<II", 12, 1))])
-    yield "dbase2.dbf", narrow(0x02, [("NAME", "C", 4, 0), ("N", "N", 2, 0)],
-                               [rec(b"ann ", b" 1"), rec(b"bob ", b" 2", live=False)])
-    yield "enable33.dbf", narrow(0xFE, [("F%d" % i, "C", 1, 0) for i in range(33)], [rec(b"y" * 33)])
+    yield "dbase3.dbf", table(0x03, PLAIN, PLAIN_ROWS)
+    yield "dbase4_memo.dbf", table(0x8B, PLAIN + [("NOTE", "M", 10, 0)],
+                                   [r + text("         1", 10) for r in PLAIN_ROWS])
+    yield "dbase3_memo.dbf", table(0x83, [("NOTE", "M", 10, 0), ("ID", "N", 3, 0)],
+                                   [rec(text("         1", 10), text("  1", 3))])
+    yield "foxpro.dbf", table(0xF5, PLAIN + [("PIC", "G", 10, 0)], [r + text("", 10) for r in PLAIN_ROWS])
+    yield "clipper_smt.dbf", table(0xE5, [("NOTE", "M", 10, 0)],
+                                   [rec(b"\x00\x00" + struct.pack("<II", 12, 1))])
+    yield "dbase2.dbf", table(0x02, [("NAME", "C", 4, 0), ("N", "N", 2, 0)],
+                              [rec(b"ann ", b" 1"), rec(b"bob ", b" 2", live=False)], narrow=True)
+    yield "enable33.dbf", table(0xFE, [("F%d" % i, "C", 1, 0) for i in range(33)], [rec(b"y" * 33)],
+                                narrow=True)
     vfp_fields = [("ID", "C", 3, 0), ("QTY", "I", 4, 0), ("PRICE", "Y", 8, 4), ("AT", "T", 8, 0),
                   ("RATE", "B", 8, 0), ("_NullFlags", "0", 1, 0)]
     vfp_rows = [
@@ -89,16 +75,16 @@ def seeds():
         rec(b"cd ", struct.pack("<i", 123456), struct.pack("<q", -15000), struct.pack("<ii", 0, 0),
             struct.pack("<d", -0.5), b"\x10"),
     ]
-    yield "vfp.dbf", wide(0x30, vfp_fields, vfp_rows, extra=263)
-    yield "count_beyond.dbf", wide(0x03, [("ID", "C", 2, 0)], [rec(b"p0"), rec(b"p1")], count=1000,
-                                   end_mark=False)
+    yield "vfp.dbf", table(0x30, vfp_fields, vfp_rows, extra=263)
+    yield "count_beyond.dbf", table(0x03, [("ID", "C", 2, 0)], [rec(b"p0"), rec(b"p1")], count=1000,
+                                    end_mark=False)
     yield "field_past.dbf", _field_past()
-    yield "empty.dbf", wide(0x03, PLAIN, [], end_mark=False)
+    yield "empty.dbf", table(0x03, PLAIN, [], end_mark=False)
 
 
 def _field_past():
     # Fields of 3 + 4 bytes in records of 1 + 5: the second runs past.
-    t = bytearray(wide(0x03, [("A", "C", 3, 0), ("B", "C", 4, 0)], []))
+    t = bytearray(table(0x03, [("A", "C", 3, 0), ("B", "C", 4, 0)], []))
     struct.pack_into("<H", t, 10, 6)
     t = t[:-1] + rec(b"abcde") + rec(b"fghij") + b"\x1a"
     return bytes(t)

@@ -2,18 +2,15 @@
 // range of blocks and lengths, then stores and frees on the same (scratch)
 // copy. Input: one byte that picks the kind, two bytes of length seed, then
 // the memo file.
-#include <unistd.h>
 
 #include <cstddef>
 #include <cstdint>
-#include <cstdio>
 #include <string>
 
 #include "fuzz/scratch_file.h"
-#include <sys/stat.h>
-
 #include "table/dbf.h"
 #include "table/memo.h"
+#include "tests/support/dbf_builder.h"
 
 namespace {
 
@@ -29,20 +26,6 @@ constexpr Kind kKinds[] = {
     {0xE5, DIALECT_CLIPPER, "smt"},
 };
 
-// A wide table with one memo field and no records.
-bool WriteTable(const std::string& path, uint8_t version) {
-  uint8_t t[66] = {};
-  t[0] = version;
-  t[8] = 66;
-  t[10] = 11;
-  const char name[] = "NOTES";
-  for (int i = 0; name[i] != '\0'; ++i) t[32 + i] = uint8_t(name[i]);
-  t[32 + 11] = 'M';
-  t[32 + 16] = 10;
-  t[64] = 0x0D;
-  return fuzz::WriteScratch(path, t, sizeof t);
-}
-
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
@@ -51,7 +34,9 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
   uint32_t seed = uint32_t(data[1]) | uint32_t(data[2]) << 8;
   std::string table = fuzz::ScratchDir("memofuzz") + "/t.dbf";
   std::string memo = fuzz::ScratchDir("memofuzz") + "/t." + kind.ext;
-  if (!WriteTable(table, kind.version) || !fuzz::WriteScratch(memo, data + 3, size - 3)) return 0;
+  // A wide table with one memo field and no records.
+  tests::Bytes t = tests::DbfBuilder(kind.version).Field("NOTES", 'M', 10).Build();
+  if (!fuzz::WriteScratch(table, t.data(), t.size()) || !fuzz::WriteScratch(memo, data + 3, size - 3)) return 0;
 
   ZQDBFIELD* fields[kMaxFields] = {};
   int dialect = kind.dialect;

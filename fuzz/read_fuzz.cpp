@@ -8,13 +8,9 @@
 // byte belongs to, dBASE IV (the default), and one more picked by its value,
 // so that bytes are also read under dialects they don't fit. The passes vary
 // the memo policy and the code page.
-#include <sys/stat.h>
-#include <unistd.h>
 
 #include <cstddef>
 #include <cstdint>
-#include <cstdio>
-#include <cstdlib>
 #include <string>
 
 #include "connector/frdbase.h"
@@ -27,7 +23,6 @@ constexpr size_t kMaxInput = 1 << 20;
 constexpr int32_t kMaxRecords = 100000;
 
 void Quiet(void*, int, BATCHERR, const char*) {}
-
 
 void ReadAll(const char* path, int dialect, int memo_policy, int codepage) {
   ZQFromDbase* spoke = NewFromDbase(ZQSpokeDef{});

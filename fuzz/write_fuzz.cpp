@@ -10,12 +10,9 @@
 // records are appended, then the first records are read, prepared for
 // replacement and written over, blank and not. Dialects as in read_fuzz: the
 // one the version byte belongs to and dBASE IV.
-#include <unistd.h>
 
 #include <cstddef>
 #include <cstdint>
-#include <cstdio>
-#include <cstdlib>
 #include <string>
 
 #include "connector/todbase.h"
@@ -28,8 +25,6 @@ namespace {
 constexpr size_t kMaxInput = 1 << 20;
 
 void Quiet(void*, int, BATCHERR, const char*) {}
-
-
 
 // One value for every field: which one goes by the field's type and `round`.
 void Fill(ZQRecord& layout, int round) {

@@ -9,10 +9,13 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <fstream>
+#include <iterator>
 #include <string>
 #include <vector>
 
@@ -47,23 +50,11 @@ class DbfBuilder {
     return *this;
   }
   // Extra bytes behind the terminator of a wide header (Visual FoxPro has 263).
-  DbfBuilder& HeaderExtra(int n) {
-    extra_ = n;
-    return *this;
-  }
+  DbfBuilder& HeaderExtra(int n) { extra_ = n; return *this; }
   // Overrides the record count written in the header (-1: the real count).
-  DbfBuilder& CountInHeader(int32_t n) {
-    count_override_ = n;
-    return *this;
-  }
-  DbfBuilder& RecordLength(int n) {
-    reclen_override_ = n;
-    return *this;
-  }
-  DbfBuilder& NoEndMark() {
-    end_mark_ = false;
-    return *this;
-  }
+  DbfBuilder& CountInHeader(int32_t n) { count_override_ = n; return *this; }
+  DbfBuilder& RecordLength(int n) { reclen_override_ = n; return *this; }
+  DbfBuilder& NoEndMark() { end_mark_ = false; return *this; }
 
   int RecLen() const {
     if (reclen_override_ >= 0) return reclen_override_;
@@ -77,47 +68,39 @@ class DbfBuilder {
     return int(32 + 32 * fields_.size() + 1 + extra_);
   }
 
+  // Narrow: count (16 bits), month, year, day, record length; descriptors of
+  // 16 bytes (length at 12, decimals at 15) from 8. Wide: year, month, day,
+  // count, header length, record length; descriptors of 32 bytes (length at
+  // 16, decimals at 17) from 32.
   Bytes Build() const {
-    Bytes out;
     int32_t count = count_override_ >= 0 ? count_override_ : int32_t(records_.size());
+    Bytes out(narrow_ ? 8 : 32, 0);
+    out[0] = version_;
     if (narrow_) {
-      out.resize(8, 0);
-      out[0] = version_;
       PutLe16(&out[1], uint16_t(count));
-      out[3] = 1;   // month
-      out[4] = 24;  // year
-      out[5] = 2;   // day
+      out[3] = 1;
+      out[4] = 24;
+      out[5] = 2;
       PutLe16(&out[6], uint16_t(RecLen()));
-      for (const auto& f : fields_) {
-        uint8_t d[16] = {0};
-        for (size_t i = 0; i < f.name.size() && i < 11; ++i) d[i] = uint8_t(f.name[i]);
-        d[11] = uint8_t(f.type);
-        d[12] = uint8_t(f.length);
-        d[15] = uint8_t(f.decimals);
-        out.insert(out.end(), d, d + 16);
-      }
-      out.push_back(0x0D);
-      out.resize(size_t(HeaderLength()), 0);
     } else {
-      out.resize(32, 0);
-      out[0] = version_;
       out[1] = 124;
       out[2] = 1;
       out[3] = 2;
       PutLe32(&out[4], uint32_t(count));
       PutLe16(&out[8], uint16_t(HeaderLength()));
       PutLe16(&out[10], uint16_t(RecLen()));
-      for (const auto& f : fields_) {
-        uint8_t d[32] = {0};
-        for (size_t i = 0; i < f.name.size() && i < 11; ++i) d[i] = uint8_t(f.name[i]);
-        d[11] = uint8_t(f.type);
-        d[16] = uint8_t(f.length);
-        d[17] = uint8_t(f.decimals);
-        out.insert(out.end(), d, d + 32);
-      }
-      out.push_back(0x0D);
-      out.resize(size_t(HeaderLength()), 0);
     }
+    const size_t length_at = narrow_ ? 12 : 16;
+    for (const auto& f : fields_) {
+      Bytes d(narrow_ ? 16 : 32, 0);
+      for (size_t i = 0; i < f.name.size() && i < 11; ++i) d[i] = uint8_t(f.name[i]);
+      d[11] = uint8_t(f.type);
+      d[length_at] = uint8_t(f.length);
+      d[narrow_ ? 15 : 17] = uint8_t(f.decimals);
+      out.insert(out.end(), d.begin(), d.end());
+    }
+    out.push_back(0x0D);
+    out.resize(size_t(HeaderLength()), 0);
     for (const auto& r : records_) out.insert(out.end(), r.begin(), r.end());
     if (end_mark_) out.push_back(0x1A);
     return out;
@@ -125,15 +108,13 @@ class DbfBuilder {
 
  private:
   DbfBuilder& Add(char flag, const std::vector<std::string>& values) {
-    Bytes r;
-    r.push_back(uint8_t(flag));
+    Bytes r{uint8_t(flag)};
     for (size_t i = 0; i < fields_.size(); ++i) {
       std::string v = i < values.size() ? values[i] : "";
       v.resize(size_t(fields_[i].length), ' ');
       r.insert(r.end(), v.begin(), v.end());
     }
-    records_.push_back(r);
-    return *this;
+    return RawRecord(r);
   }
 
   uint8_t version_;
@@ -178,9 +159,7 @@ inline Bytes NumberedTable(int count, const std::vector<int>& deleted) {
   b.Field("PHYS", 'C', 6);
   for (int p = 0; p < count; ++p) {
     std::string v = "p" + std::to_string(p);
-    bool gone = false;
-    for (int d : deleted) gone = gone || d == p;
-    if (gone) b.Deleted({v});
+    if (std::find(deleted.begin(), deleted.end(), p) != deleted.end()) b.Deleted({v});
     else b.Record({v});
   }
   return b.Build();
@@ -204,25 +183,22 @@ inline std::string ScratchPath(const std::string& name) {
   return dir + "/" + name;
 }
 
-// Writes bytes to a file in this process's scratch directory.
-inline std::string WriteScratch(const std::string& name, const Bytes& bytes) {
-  std::string path = ScratchPath(name);
-  FILE* f = fopen(path.c_str(), "wb");
-  if (f == nullptr) return "";
-  if (!bytes.empty()) fwrite(bytes.data(), 1, bytes.size(), f);
-  fclose(f);
-  return path;
+// Writes bytes to `path`; the path, or "" when the file can't be made.
+inline std::string WriteAt(const std::string& path, const Bytes& bytes) {
+  std::ofstream out(path, std::ios::binary | std::ios::trunc);
+  out.write(reinterpret_cast<const char*>(bytes.data()), std::streamsize(bytes.size()));
+  return out ? path : "";
 }
 
+// Writes bytes to a file in this process's scratch directory.
+inline std::string WriteScratch(const std::string& name, const Bytes& bytes) {
+  return WriteAt(ScratchPath(name), bytes);
+}
+
+// The bytes of a file; none when it can't be read.
 inline Bytes ReadFile(const std::string& path) {
-  Bytes out;
-  FILE* f = fopen(path.c_str(), "rb");
-  if (f == nullptr) return out;
-  uint8_t buf[4096];
-  size_t n;
-  while ((n = fread(buf, 1, sizeof buf, f)) > 0) out.insert(out.end(), buf, buf + n);
-  fclose(f);
-  return out;
+  std::ifstream in(path, std::ios::binary);
+  return Bytes(std::istreambuf_iterator<char>(in), std::istreambuf_iterator<char>());
 }
 
 }  // namespace tests

@@ -4,21 +4,17 @@
 //   auto memo = MemoBytes(Db4Header(3, 0x0101, 512)).At(1, Db4Block("hello"), 512).Build();
 #pragma once
 
-#include <unistd.h>
-
 #include <cstdint>
-#include <cstdlib>
 #include <cstring>
 #include <string>
-#include <sys/stat.h>
 
 #include "host/endian.h"
 #include "table/dbf.h"
 #include "table/memo.h"
 #include "tests/support/dbf_builder.h"
+#include "tests/support/read_harness.h"
 
 namespace tests {
-
 
 // Headers of the four layouts, 512 bytes each.
 inline Bytes Db3Header(uint32_t next) {
@@ -99,35 +95,14 @@ class MemoBytes {
   Bytes bytes_;
 };
 
-// A path in this process's scratch directory (see dbf_builder.h).
-inline std::string MemoScratch(const std::string& name) { return ScratchPath(name); }
+// A table with one memo field and its memo file (none when `ext` is empty),
+// opened writable.
+struct MemoTable : OpenedTable {
+  MemoTable(const std::string& stem, uint8_t version, int dialect, const std::string& ext, const Bytes& memo)
+      : OpenedTable(Write(stem, version, ext, memo), dialect, true), memo_path(ScratchPath(stem + "." + ext)) {}
+  // A table already made, opened writable.
+  MemoTable(const std::string& table, int dialect) : OpenedTable(table, dialect, true) {}
 
-inline std::string WriteAt(const std::string& path, const Bytes& bytes) {
-  FILE* f = fopen(path.c_str(), "wb");
-  if (f == nullptr) return "";
-  if (!bytes.empty()) fwrite(bytes.data(), 1, bytes.size(), f);
-  fclose(f);
-  return path;
-}
-
-// A table with one memo field and its memo file, opened writable.
-struct MemoTable {
-  MemoTable(const std::string& stem, uint8_t version, int dialect, const std::string& ext, const Bytes& memo) {
-    path = MemoScratch(stem + ".dbf");
-    WriteAt(path, DbfBuilder(version).Field("NOTES", 'M', 10).Build());
-    memo_path = MemoScratch(stem + "." + ext);
-    if (!ext.empty()) WriteAt(memo_path, memo);
-    int v = dialect;
-    db = dbopen(nullptr, path.c_str(), fields, &v, true);
-  }
-  ~MemoTable() { Close(); }
-  MemoTable(const MemoTable&) = delete;
-  MemoTable& operator=(const MemoTable&) = delete;
-
-  void Close() {
-    if (db != nullptr) dbclose(fields, db);
-    db = nullptr;
-  }
   std::string Get(uint32_t block, uint32_t length = 0, bool* ok = nullptr) {
     ZQString text;
     db->memostat = 1;
@@ -144,9 +119,13 @@ struct MemoTable {
     return ReadFile(memo_path);
   }
 
-  std::string path, memo_path;
-  ZQDBFIELD* fields[kMaxFields] = {};
-  ZQDBFILE* db = nullptr;
+  std::string memo_path;
+
+ private:
+  static std::string Write(const std::string& stem, uint8_t version, const std::string& ext, const Bytes& memo) {
+    if (!ext.empty()) WriteScratch(stem + "." + ext, memo);
+    return WriteScratch(stem + ".dbf", DbfBuilder(version).Field("NOTES", 'M', 10).Build());
+  }
 };
 
 }  // namespace tests

@@ -3,6 +3,7 @@
 // included); dbput, dbclose and dbdelete on a new table.
 #include <gtest/gtest.h>
 
+#include <cstdio>
 #include <string>
 #include <vector>
 
@@ -18,30 +19,26 @@ using tests::Bytes;
 constexpr int kMemo = 0x8000;
 
 // Descriptors owned by the test; dbcreat pads their names in place.
-struct Fields {
-  Fields& Add(const std::string& name, char type, int length, int decimals = 0) {
-    ZQDBFIELD f{};
-    for (size_t i = 0; i < name.size() && i < 11; ++i) f.name[i] = name[i];
-    f.type = int8_t(type);
-    f.length = uint8_t(length);
-    f.decimals = uint8_t(decimals);
-    list.push_back(f);
-    return *this;
-  }
-  ZQDBFIELD** Ptrs() {
-    ptrs.clear();
-    for (auto& f : list) ptrs.push_back(&f);
-    ptrs.push_back(nullptr);
-    return ptrs.data();
-  }
-  int Count() const { return int(list.size()); }
-  std::vector<ZQDBFIELD> list;
-  std::vector<ZQDBFIELD*> ptrs;
-};
+using Fields = std::vector<ZQDBFIELD>;
 
-std::string Create(const std::string& file, Fields& f, int version, bool production = false) {
-  std::string path = tests::MemoScratch(file);
-  EXPECT_EQ(dbcreat(path.c_str(), f.Count(), f.Ptrs(), version, production), 0) << file;
+// `n` fields F0, F1, ... of one type and length.
+Fields Numbered(int n, char type, uint16_t length) {
+  Fields f(size_t(n), ZQDBFIELD{"", int8_t(type), length, 0});
+  for (int i = 0; i < n; ++i) snprintf(f[size_t(i)].name, sizeof f[0].name, "F%d", i);
+  return f;
+}
+
+int DbCreat(const std::string& path, Fields f, int version, bool production = false) {
+  std::vector<ZQDBFIELD*> ptrs;
+  for (auto& d : f) ptrs.push_back(&d);
+  ptrs.push_back(nullptr);
+  return dbcreat(path.c_str(), int(f.size()), ptrs.data(), version, production);
+}
+
+// A table made in the scratch file `file`; its path.
+std::string Create(const std::string& file, const Fields& f, int version, bool production = false) {
+  std::string path = tests::ScratchPath(file);
+  EXPECT_EQ(DbCreat(path, f, version, production), 0) << file;
   return path;
 }
 
@@ -51,6 +48,7 @@ std::string Sibling(const std::string& path, const std::string& ext) {
 
 // Checks the date bytes against today and blanks them for a byte comparison.
 void TakeDate(Bytes& b, int day_off, int month_off, int year_off) {
+  ASSERT_GE(b.size(), 32u);
   char day, month, year;
   dbdate(&day, &month, &year);
   EXPECT_EQ(b[size_t(day_off)], uint8_t(day));
@@ -71,32 +69,30 @@ Bytes WideDescriptor(const char* name, char type, uint8_t length, uint8_t decima
   return d;
 }
 
+// A wide header with its date blanked: the flags at 28, the descriptors, the
+// terminator and `room` zero bytes behind it (1, or Visual FoxPro's 263).
+Bytes WideHeader(uint8_t version, uint16_t reclen, uint8_t flags, std::initializer_list<Bytes> descriptors,
+                 size_t room = 1) {
+  Bytes h(32, 0);
+  h[0] = version;
+  PutLe16(&h[8], uint16_t(32 + 32 * descriptors.size() + 1 + room));
+  PutLe16(&h[10], reclen);
+  h[28] = flags;
+  for (const Bytes& d : descriptors) h.insert(h.end(), d.begin(), d.end());
+  h.push_back(0x0D);
+  h.resize(h.size() + room, 0);
+  return h;
+}
+
 TEST(Create, WideHeaderWithMemoFieldsAndProductionFlag) {
-  Fields f;
-  f.Add("NAME", 'C', 10).Add("NOTES", 'M', 4).Add("AMOUNT", 'N', 8, 2);
+  Fields f = {{"NAME", 'C', 10, 0}, {"NOTES", 'M', 4, 0}, {"AMOUNT", 'N', 8, 2}};
   std::string path = Create("wide4.dbf", f, DIALECT_DBASE4 | kMemo, true);
   Bytes b = tests::ReadFile(path);
-  ASSERT_EQ(b.size(), 130u);
   TakeDate(b, 3, 2, 1);
-  Bytes want = {0x8B, 0, 0, 0, 0, 0, 0, 0, 0x82, 0x00, 0x1D, 0x00};  // header 130, record 29
-  want.resize(32, 0);
-  want[28] = 1;
-  for (const Bytes& d : {WideDescriptor("NAME", 'C', 10, 0), WideDescriptor("NOTES", 'M', 10, 0),
-                         WideDescriptor("AMOUNT", 'N', 8, 2)})
-    want.insert(want.end(), d.begin(), d.end());
-  want.push_back(0x0D);
-  want.push_back(0x00);
-  EXPECT_EQ(b, want);
-
-  Bytes memo = tests::ReadFile(Sibling(path, "dbt"));
-  Bytes want_memo(512, 0);
-  want_memo[0] = 1;
-  for (int i = 0; i < 5; ++i) want_memo[size_t(8 + i)] = uint8_t("WIDE4"[i]);
-  want_memo[18] = 0x01;
-  want_memo[19] = 0x01;
-  want_memo[20] = 0x00;
-  want_memo[21] = 0x02;
-  EXPECT_EQ(memo, want_memo);
+  EXPECT_EQ(b, WideHeader(0x8B, 29, 1,
+                          {WideDescriptor("NAME", 'C', 10, 0), WideDescriptor("NOTES", 'M', 10, 0),
+                           WideDescriptor("AMOUNT", 'N', 8, 2)}));
+  EXPECT_EQ(tests::ReadFile(Sibling(path, "dbt")), tests::Db4Header(1, 0x0101, 512, "WIDE4"));
 
   // Reopened in the same dialect: the same fields, the memo as dBASE IV.
   tests::OpenedTable t(path, DIALECT_DBASE4);
@@ -115,43 +111,36 @@ TEST(Create, MemoHeaderOfEachKind) {
     const char* file;
     const char* ext;
     uint8_t version;
-    Bytes head;  // the memo file's first bytes; zeros follow to 512
+    Bytes memo;
   } cases[] = {
-      {DIALECT_DBASE3P, "m1.dbf", "dbt", 0x83, {1, 0, 0, 0}},
-      {DIALECT_DBASE3, "m4.dbf", "dbt", 0x83, {1, 0, 0, 0}},
-      {DIALECT_ENABLEOA, "m7.dbf", "dbt", 0x8B, {1, 0, 0, 0}},
-      {DIALECT_VFOXPRO, "m10.dbf", "fpt", 0x30, {0, 0, 0, 8, 0, 0, 0, 0x40}},
-      {DIALECT_FOXPRO, "m6.dbf", "fpt", 0xF5, {0, 0, 0, 1, 0, 0, 0, 0x80}},
-      {DIALECT_CLIPPER, "m8.dbf", "smt", 0xE5, {8, 0, 0, 0, 0x40, 0, 0, 0}},
-      {DIALECT_VDBASE, "averyverylongname.dbf", "dbt", 0x8B,
-       {1, 0, 0, 0, 0, 0, 0, 0, 'A', 'V', 'E', 'R', 'Y', 'V', 'E', 'R', 'Y', 0, 1, 1, 0, 2}},
+      {DIALECT_DBASE3P, "m1.dbf", "dbt", 0x83, tests::Db3Header(1)},
+      {DIALECT_DBASE3, "m4.dbf", "dbt", 0x83, tests::Db3Header(1)},
+      {DIALECT_ENABLEOA, "m7.dbf", "dbt", 0x8B, tests::Db3Header(1)},
+      {DIALECT_VFOXPRO, "m10.dbf", "fpt", 0x30, tests::FptHeader(8, 64)},
+      {DIALECT_FOXPRO, "m6.dbf", "fpt", 0xF5, tests::FptHeader(1, 128)},
+      {DIALECT_CLIPPER, "m8.dbf", "smt", 0xE5, tests::SmtHeader(8, 64)},
+      {DIALECT_VDBASE, "averyverylongname.dbf", "dbt", 0x8B, tests::Db4Header(1, 0x0101, 512, "AVERYVERY")},
       // The unnamed dialect writes 0x8B, read as the dBASE IV form: it gets
       // that form's header, so that it reads its own memos back.
-      {DIALECT_UNNAMED, "m5.dbf", "dbt", 0x8B, {1, 0, 0, 0, 0, 0, 0, 0, 'M', '5', 0, 0, 0, 0, 0, 0, 0, 0, 1, 1, 0, 2}},
+      {DIALECT_UNNAMED, "m5.dbf", "dbt", 0x8B, tests::Db4Header(1, 0x0101, 512, "M5")},
   };
   for (const Case& c : cases) {
-    Fields f;
-    f.Add("PIC", c.dialect == DIALECT_FOXPRO ? 'G' : 'M', 10);
-    std::string path = Create(c.file, f, c.dialect | kMemo);
-    EXPECT_EQ(tests::ReadFile(path)[0], c.version) << c.file;
-    Bytes want = c.head;
-    want.resize(512, 0);
-    EXPECT_EQ(tests::ReadFile(Sibling(path, c.ext)), want) << c.file;
-    tests::OpenedTable t(path, c.dialect, true);
-    ASSERT_NE(t.db, nullptr) << c.file;
-    EXPECT_EQ(t.db->memofailed, 0) << c.file;
-    uint32_t at = putmemo(t.db, 0, ZQString("round trip"));
-    EXPECT_NE(at, 0u) << c.file;
-    ZQString text;
-    EXPECT_TRUE(getmemo(t.db, at, 10, text)) << c.file;
-    EXPECT_EQ(std::string(text.c_str()), "round trip") << c.file;
+    SCOPED_TRACE(c.file);
+    int8_t type = c.dialect == DIALECT_FOXPRO ? 'G' : 'M';
+    std::string path = Create(c.file, {{"PIC", type, 10, 0}}, c.dialect | kMemo);
+    EXPECT_EQ(tests::ReadFile(path)[0], c.version);
+    EXPECT_EQ(tests::ReadFile(Sibling(path, c.ext)), c.memo);
+    tests::MemoTable t(path, c.dialect);
+    ASSERT_NE(t.db, nullptr);
+    EXPECT_EQ(t.db->memofailed, 0);
+    uint32_t at = t.Put(0, "round trip");
+    EXPECT_NE(at, 0u);
+    EXPECT_EQ(t.Get(at, 10), "round trip");
   }
 }
 
 TEST(Create, NarrowHeaderTakesTheRoomOf32Fields) {
-  Fields none;
-  std::string p0 = Create("n0.dbf", none, DIALECT_DBASE2);
-  Bytes b = tests::ReadFile(p0);
+  Bytes b = tests::ReadFile(Create("n0.dbf", {}, DIALECT_DBASE2));
   ASSERT_EQ(b.size(), 521u);
   TakeDate(b, 5, 3, 4);
   Bytes want(521, 0);
@@ -160,8 +149,7 @@ TEST(Create, NarrowHeaderTakesTheRoomOf32Fields) {
   want[8] = 0x0D;
   EXPECT_EQ(b, want);
 
-  Fields f32;
-  for (int i = 0; i < 32; ++i) f32.Add("F" + std::to_string(i), 'C', 2);
+  Fields f32 = Numbered(32, 'C', 2);
   std::string p32 = Create("n32.dbf", f32, DIALECT_ENABLE);
   b = tests::ReadFile(p32);
   ASSERT_EQ(b.size(), 521u);
@@ -175,7 +163,7 @@ TEST(Create, NarrowHeaderTakesTheRoomOf32Fields) {
   // 33 fields: 0xFE, no filler, and an empty memo file of the dBASE IV form,
   // the form in which 0xFE reopens, so that the table opens cleanly.
   Fields f33 = f32;
-  f33.Add("F32", 'N', 3, 1);
+  f33.push_back({"F32", 'N', 3, 1});
   std::string p33 = Create("n33.dbf", f33, DIALECT_ENABLE);
   b = tests::ReadFile(p33);
   ASSERT_EQ(b.size(), 537u);
@@ -183,9 +171,7 @@ TEST(Create, NarrowHeaderTakesTheRoomOf32Fields) {
   EXPECT_EQ(Bytes(b.begin() + 520, b.begin() + 536),
             (Bytes{'F', '3', '2', 0, 0, 0, 0, 0, 0, 0, 0, 'N', 3, 0, 0, 1}));
   EXPECT_EQ(b[536], 0x0D);
-  Bytes memo = {1, 0, 0, 0, 0, 0, 0, 0, 'N', '3', '3', 0, 0, 0, 0, 0, 0, 0, 1, 1, 0, 2};
-  memo.resize(512, 0);
-  EXPECT_EQ(tests::ReadFile(Sibling(p33, "dbt")), memo);
+  EXPECT_EQ(tests::ReadFile(Sibling(p33, "dbt")), tests::Db4Header(1, 0x0101, 512, "N33"));
   tests::OpenedTable t(p33, DIALECT_ENABLE);
   ASSERT_NE(t.db, nullptr);
   EXPECT_EQ(t.db->fieldcount, 33);
@@ -196,137 +182,113 @@ TEST(Create, NarrowHeaderTakesTheRoomOf32Fields) {
 }
 
 TEST(Create, WideEdgeCases) {
-  Fields none;
-  Bytes b = tests::ReadFile(Create("w0.dbf", none, DIALECT_DBASE3));
-  ASSERT_EQ(b.size(), 34u);
-  EXPECT_EQ(b[0], 0x03);
-  EXPECT_EQ(GetLe16(&b[8]), 34);
-  EXPECT_EQ(GetLe16(&b[10]), 1);
-  EXPECT_EQ(b[32], 0x0D);
+  Bytes b = tests::ReadFile(Create("w0.dbf", {}, DIALECT_DBASE3));
+  TakeDate(b, 3, 2, 1);
+  EXPECT_EQ(b, WideHeader(0x03, 1, 0, {}));
 
   // A name of all 11 bytes has no NUL in the file.
-  Fields eleven;
-  eleven.Add("ABCDEFGHIJK", 'C', 5);
-  b = tests::ReadFile(Create("w11.dbf", eleven, DIALECT_DBASE3P));
+  b = tests::ReadFile(Create("w11.dbf", {{"ABCDEFGHIJK", 'C', 5, 0}}, DIALECT_DBASE3P));
   EXPECT_EQ(Bytes(b.begin() + 32, b.begin() + 44), tests::Text("ABCDEFGHIJKC"));
 
   // A record length past 16 bits is refused before any file is made.
-  Fields wide;
-  for (int i = 0; i < 300; ++i) wide.Add("F" + std::to_string(i), 'C', 255);
-  std::string path = tests::MemoScratch("wbig.dbf");
-  EXPECT_EQ(dbcreat(path.c_str(), wide.Count(), wide.Ptrs(), DIALECT_CLIPPER, false), -1);
+  std::string path = tests::ScratchPath("wbig.dbf");
+  EXPECT_EQ(DbCreat(path, Numbered(300, 'C', 255), DIALECT_CLIPPER), -1);
   EXPECT_FALSE(ZQFileProxy::fileExists(path.c_str()));
 
   // dBASE II can't read a memo field back: refused, nothing made.
-  Fields memo;
-  memo.Add("NOTES", 'M', 10);
-  path = tests::MemoScratch("d2memo.dbf");
-  EXPECT_EQ(dbcreat(path.c_str(), 1, memo.Ptrs(), DIALECT_DBASE2 | kMemo, false), -1);
-  EXPECT_EQ(dbcreat(path.c_str(), 1, memo.Ptrs(), DIALECT_DBASE2, false), -1);
+  Fields memo = {{"NOTES", 'M', 10, 0}};
+  path = tests::ScratchPath("d2memo.dbf");
+  EXPECT_EQ(DbCreat(path, memo, DIALECT_DBASE2 | kMemo), -1);
+  EXPECT_EQ(DbCreat(path, memo, DIALECT_DBASE2), -1);
   EXPECT_FALSE(ZQFileProxy::fileExists(path.c_str()));
   // Enable takes it, with a dBASE III memo file.
-  path = tests::MemoScratch("d3memo.dbf");
-  ASSERT_EQ(dbcreat(path.c_str(), 1, memo.Ptrs(), DIALECT_ENABLE | kMemo, false), 0);
-  tests::OpenedTable t(path, DIALECT_ENABLE, true);
+  tests::OpenedTable t(Create("d3memo.dbf", memo, DIALECT_ENABLE | kMemo), DIALECT_ENABLE, true);
   ASSERT_NE(t.db, nullptr);
   EXPECT_EQ(t.db->memokind, MEMO_DB3);
   EXPECT_EQ(t.db->memofailed, 0);
 }
 
-// A Visual FoxPro header (date blanked) with its descriptors, the terminator
-// and the 263 bytes behind it.
-Bytes VfpHeader(uint16_t reclen, uint8_t flags, std::initializer_list<Bytes> descriptors) {
-  Bytes h(32, 0);
-  h[0] = 0x30;
-  PutLe16(&h[8], uint16_t(32 + 32 * descriptors.size() + 264));
-  PutLe16(&h[10], reclen);
-  h[28] = flags;
-  for (const Bytes& d : descriptors) h.insert(h.end(), d.begin(), d.end());
-  h.push_back(0x0D);
-  h.resize(h.size() + 263, 0);
-  return h;
-}
-
-TEST(CreateVfp, TableWithoutMemoFields) {
-  // The caller's widths of the binary forms don't count: I is 4, T and Y 8.
-  Fields f;
-  f.Add("ID", 'I', 11).Add("NAME", 'C', 10).Add("WHEN", 'T', 19).Add("PRICE", 'Y', 20, 4).Add("AMOUNT", 'N', 8, 2);
-  std::string path = Create("vfp_plain.dbf", f, DIALECT_VFOXPRO);
-  Bytes b = tests::ReadFile(path);
-  TakeDate(b, 3, 2, 1);
-  EXPECT_EQ(b, VfpHeader(39, 0x00,  // record: 1 + 4 + 10 + 8 + 8 + 8
-                         {WideDescriptor("ID", 'I', 4, 0, 1), WideDescriptor("NAME", 'C', 10, 0, 5),
-                          WideDescriptor("WHEN", 'T', 8, 0, 15), WideDescriptor("PRICE", 'Y', 8, 4, 23),
-                          WideDescriptor("AMOUNT", 'N', 8, 2, 31)}));
-  EXPECT_FALSE(ZQFileProxy::fileExists(Sibling(path, "fpt").c_str()));
-  // Its own open takes it: the header length is read, not recomputed.
-  tests::OpenedTable t(path, DIALECT_VFOXPRO);
-  ASSERT_NE(t.db, nullptr);
-  EXPECT_EQ(t.db->hdrlen, 456);
-  EXPECT_EQ(t.db->fieldcount, 5);
-  EXPECT_EQ(t.fields[0]->length, 4);
-}
-
-TEST(CreateVfp, TableWithMemoFieldsAndProductionIndex) {
-  Fields f;
-  f.Add("NAME", 'C', 10).Add("NOTES", 'M', 10).Add("PIC", 'G', 10).Add("RATE", 'B', 10);
-  std::string path = Create("vfp_memo.dbf", f, DIALECT_VFOXPRO | kMemo, true);
-  Bytes b = tests::ReadFile(path);
-  TakeDate(b, 3, 2, 1);
-  EXPECT_EQ(b, VfpHeader(27, 0x03,  // production index and memo fields
-                         {WideDescriptor("NAME", 'C', 10, 0, 1), WideDescriptor("NOTES", 'M', 4, 0, 11),
-                          WideDescriptor("PIC", 'G', 4, 0, 15),
-                          WideDescriptor("RATE", 'B', 8, 0, 19)}));  // a double in the record, not a memo
-  EXPECT_FALSE(ZQFileProxy::fileExists(Sibling(path, "dbt").c_str()));
-  EXPECT_EQ(tests::ReadFile(Sibling(path, "fpt")), tests::FptHeader(8, 64));
-
-  // The memo engine fills it from block 8, 64 bytes a block, the header's
-  // word big-endian; a text that fits its old blocks stays where it is, a
-  // longer one goes to the end and its old blocks are lost.
-  {
-    tests::OpenedTable t(path, DIALECT_VFOXPRO, true);
-    ZQDBFILE* db = t.db;
-    ASSERT_NE(db, nullptr);
-    EXPECT_EQ(db->memoblksize, 64);
-    EXPECT_EQ(putmemo(db, 0, ZQString("first")), 8u);
-    EXPECT_EQ(putmemo(db, 0, ZQString(std::string(100, 'x').c_str())), 9u);  // (100 + 8) / 64 + 1 = 2 blocks
-    EXPECT_EQ(putmemo(db, 8, ZQString("first, longer")), 8u);
-    EXPECT_EQ(putmemo(db, 8, ZQString(std::string(70, 'y').c_str())), 11u);
-    EXPECT_EQ(deloldm(db, 11, 2), 0);  // nothing to free in this kind
-    ZQString text;
-    EXPECT_TRUE(getmemo(db, 11, 0, text));
-    EXPECT_EQ(std::string(text.c_str()), std::string(70, 'y'));
+TEST(CreateVfp, HeaderFlagsWidthsAndMemoFile) {
+  // The caller's widths of the binary forms don't count: I is 4, B, T and Y
+  // 8, M and G 4. The flags say production index (1) and memo fields (2).
+  // "B" is a double in the record, not a memo; a caller that marks a table of
+  // doubles as having memos (as the target does in every dialect) gets an
+  // empty FPT file all the same, since the table's own open looks for one
+  // whenever a "B" field is there, but its flags say it has no memo fields.
+  struct Case {
+    const char* file;
+    Fields fields;
+    int dialect;
+    bool production;
+    Bytes header;
+    bool fpt;
+  } cases[] = {
+      {"vfp_plain.dbf",
+       {{"ID", 'I', 11, 0}, {"NAME", 'C', 10, 0}, {"WHEN", 'T', 19, 0}, {"PRICE", 'Y', 20, 4},
+        {"AMOUNT", 'N', 8, 2}},
+       DIALECT_VFOXPRO, false,
+       WideHeader(0x30, 39, 0x00,  // record: 1 + 4 + 10 + 8 + 8 + 8
+                  {WideDescriptor("ID", 'I', 4, 0, 1), WideDescriptor("NAME", 'C', 10, 0, 5),
+                   WideDescriptor("WHEN", 'T', 8, 0, 15), WideDescriptor("PRICE", 'Y', 8, 4, 23),
+                   WideDescriptor("AMOUNT", 'N', 8, 2, 31)},
+                  263),
+       false},
+      {"vfp_memo.dbf",
+       {{"NAME", 'C', 10, 0}, {"NOTES", 'M', 10, 0}, {"PIC", 'G', 10, 0}, {"RATE", 'B', 10, 0}},
+       DIALECT_VFOXPRO | kMemo, true,
+       WideHeader(0x30, 27, 0x03,
+                  {WideDescriptor("NAME", 'C', 10, 0, 1), WideDescriptor("NOTES", 'M', 4, 0, 11),
+                   WideDescriptor("PIC", 'G', 4, 0, 15), WideDescriptor("RATE", 'B', 8, 0, 19)},
+                  263),
+       true},
+      {"vfp_double.dbf", {{"RATE", 'B', 8, 0}}, DIALECT_VFOXPRO | kMemo, false,
+       WideHeader(0x30, 9, 0x00, {WideDescriptor("RATE", 'B', 8, 0, 1)}, 263), true},
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(c.file);
+    std::string path = Create(c.file, c.fields, c.dialect, c.production);
+    Bytes b = tests::ReadFile(path);
+    TakeDate(b, 3, 2, 1);
+    EXPECT_EQ(b, c.header);
+    EXPECT_FALSE(ZQFileProxy::fileExists(Sibling(path, "dbt").c_str()));
+    EXPECT_EQ(ZQFileProxy::fileExists(Sibling(path, "fpt").c_str()), c.fpt);
+    if (c.fpt) {
+      EXPECT_EQ(tests::ReadFile(Sibling(path, "fpt")), tests::FptHeader(8, 64));
+    }
+    // Its own open takes it: the header length is read, not recomputed.
+    tests::OpenedTable t(path, DIALECT_VFOXPRO);
+    ASSERT_NE(t.db, nullptr);
+    EXPECT_EQ(t.db->hdrlen, int(c.header.size()));
+    EXPECT_EQ(t.db->fieldcount, int(c.fields.size()));
+    EXPECT_EQ(t.fields[0]->length, c.header[32 + 16]);
+    EXPECT_EQ(t.db->memofailed, 0);
   }
-  Bytes memo = tests::ReadFile(Sibling(path, "fpt"));
+
+  // The memo engine fills the FPT file from block 8, 64 bytes a block, the
+  // header's word big-endian; a text that fits its old blocks stays where it
+  // is, a longer one goes to the end and its old blocks are lost.
+  std::string fpt = tests::ScratchPath("vfp_memo.fpt");
+  {
+    tests::MemoTable t(tests::ScratchPath("vfp_memo.dbf"), DIALECT_VFOXPRO);
+    ASSERT_NE(t.db, nullptr);
+    EXPECT_EQ(t.db->memoblksize, 64);
+    EXPECT_EQ(t.Put(0, "first"), 8u);
+    EXPECT_EQ(t.Put(0, std::string(100, 'x')), 9u);  // (100 + 8) / 64 + 1 = 2 blocks
+    EXPECT_EQ(t.Put(8, "first, longer"), 8u);
+    EXPECT_EQ(t.Put(8, std::string(70, 'y')), 11u);
+    EXPECT_EQ(deloldm(t.db, 11, 2), 0);  // nothing to free in this kind
+    EXPECT_EQ(t.Get(11), std::string(70, 'y'));
+  }
+  Bytes memo = tests::ReadFile(fpt);
   ASSERT_EQ(memo.size(), 13u * 64);
   EXPECT_EQ(Bytes(memo.begin(), memo.begin() + 8), (Bytes{0, 0, 0, 13, 0, 0, 0, 64}));
-  Bytes block8 = {0, 0, 0, 1, 0, 0, 0, 13};
-  for (char c : std::string("first, longer")) block8.push_back(uint8_t(c));
+  Bytes block8 = tests::FptBlock("first, longer");
   block8.resize(64, 0);
   EXPECT_EQ(Bytes(memo.begin() + 512, memo.begin() + 576), block8);
 }
 
-TEST(CreateVfp, DoublesOnlyGetAnEmptyMemoFile) {
-  // A caller that marks the table as having memos for a "B" field (as the
-  // target does in every dialect) gets an empty FPT file: the table's own open
-  // looks for one whenever a "B" field is there. The flags still say that the
-  // table has no memo fields.
-  Fields f;
-  f.Add("RATE", 'B', 8);
-  std::string path = Create("vfp_double.dbf", f, DIALECT_VFOXPRO | kMemo);
-  Bytes b = tests::ReadFile(path);
-  TakeDate(b, 3, 2, 1);
-  EXPECT_EQ(b, VfpHeader(9, 0x00, {WideDescriptor("RATE", 'B', 8, 0, 1)}));
-  EXPECT_EQ(tests::ReadFile(Sibling(path, "fpt")), tests::FptHeader(8, 64));
-  tests::OpenedTable t(path, DIALECT_VFOXPRO);
-  ASSERT_NE(t.db, nullptr);
-  EXPECT_EQ(t.db->memofailed, 0);
-}
-
 TEST(Put, AppendsRewritesAndCloseStampsTheCount) {
-  Fields f;
-  f.Add("NAME", 'C', 4);
-  std::string path = Create("put.dbf", f, DIALECT_DBASE3);
+  std::string path = Create("put.dbf", {{"NAME", 'C', 4, 0}}, DIALECT_DBASE3);
   tests::OpenedTable t(path, DIALECT_DBASE3, true);
   ZQDBFILE* db = t.db;
   ASSERT_NE(db, nullptr);
@@ -352,9 +314,7 @@ TEST(Put, AppendsRewritesAndCloseStampsTheCount) {
 
 TEST(Put, NarrowCountRefusesThe65536thRecord) {
   for (int dialect : {DIALECT_DBASE2, DIALECT_ENABLE}) {
-    Fields f;
-    f.Add("C", 'C', 1);
-    std::string path = Create("narrow" + std::to_string(dialect) + ".dbf", f, dialect);
+    std::string path = Create("narrow" + std::to_string(dialect) + ".dbf", {{"C", 'C', 1, 0}}, dialect);
     tests::OpenedTable t(path, dialect, true);
     ZQDBFILE* db = t.db;
     ASSERT_NE(db, nullptr);
@@ -372,9 +332,7 @@ TEST(Put, NarrowCountRefusesThe65536thRecord) {
 }
 
 TEST(Delete, RemovesTheTableAndItsMemoFile) {
-  Fields f;
-  f.Add("NOTES", 'M', 10);
-  std::string path = Create("gone.dbf", f, DIALECT_FOXPRO | kMemo);
+  std::string path = Create("gone.dbf", {{"NOTES", 'M', 10, 0}}, DIALECT_FOXPRO | kMemo);
   ASSERT_TRUE(ZQFileProxy::fileExists(Sibling(path, "fpt").c_str()));
   EXPECT_EQ(dbdelete(path.c_str(), true, char(MEMO_FPT)), 0);
   EXPECT_FALSE(ZQFileProxy::fileExists(path.c_str()));

@@ -15,38 +15,47 @@ using tests::Text;
 
 using tests::MemoTable;
 
+// A read of a memo: its block and length, the text and the result expected.
+struct Read {
+  uint32_t block, length;
+  std::string text;
+  bool ok;
+};
+void ExpectReads(MemoTable& t, std::initializer_list<Read> reads) {
+  for (const Read& r : reads) {
+    bool ok = !r.ok;
+    EXPECT_EQ(t.Get(r.block, r.length, &ok), r.text) << "block " << r.block;
+    EXPECT_EQ(ok, r.ok) << "block " << r.block;
+  }
+}
+
 TEST(MemoOpen, ChoosesKindAndBlockSizeFromTheFiles) {
-  MemoTable db3("open3", 0x83, 1, "dbt", tests::Db3Header(1));
-  ASSERT_NE(db3.db, nullptr);
-  EXPECT_EQ(db3.db->memofailed, 0);
-  EXPECT_EQ(db3.db->memokind, MEMO_DB3);
-  EXPECT_EQ(db3.db->memoblksize, 512);
-
-  MemoTable db4("open4", 0x8B, 2, "dbt", tests::Db4Header(1, 0x0101, 1024));
-  EXPECT_EQ(db4.db->memokind, MEMO_DB4);
-  EXPECT_EQ(db4.db->memoblksize, 1024);
-  EXPECT_EQ(db4.db->memooff, 0);
-
-  MemoTable free4("openfree", 0x8B, 2, "dbt", tests::Db4Header(1, 0x0102, 512));
-  EXPECT_EQ(free4.db->memokind, MEMO_DB4FREE);
-
-  // The same byte under Enable OA means the dBASE III form.
-  MemoTable oa("openoa", 0x8B, 7, "dbt", tests::Db3Header(1));
-  EXPECT_EQ(oa.db->memokind, MEMO_DB3);
-  EXPECT_EQ(oa.db->memofailed, 0);
-
-  MemoTable fpt("openfpt", 0xF5, 6, "fpt", tests::FptHeader(8, 64));
-  EXPECT_EQ(fpt.db->memokind, MEMO_FPT);
-  EXPECT_EQ(fpt.db->memoblksize, 64);
-
-  Bytes smt_header = tests::SmtHeader(8, 0x00010040);  // only the low 16 bits count
-  MemoTable smt("opensmt", 0xE5, 8, "smt", smt_header);
-  EXPECT_EQ(smt.db->memokind, MEMO_SMT);
-  EXPECT_EQ(smt.db->memoblksize, 64);
-
-  // The extension in upper case is tried when the lower-case one is missing.
-  MemoTable upper("openup", 0x83, 1, "DBT", tests::Db3Header(1));
-  EXPECT_EQ(upper.db->memofailed, 0);
+  struct Case {
+    const char* stem;
+    uint8_t version;
+    int dialect;
+    const char* ext;
+    Bytes header;
+    uint8_t kind;
+    int blksize;
+  } cases[] = {
+      {"open3", 0x83, 1, "dbt", tests::Db3Header(1), MEMO_DB3, 512},
+      {"open4", 0x8B, 2, "dbt", tests::Db4Header(1, 0x0101, 1024), MEMO_DB4, 1024},
+      {"openfree", 0x8B, 2, "dbt", tests::Db4Header(1, 0x0102, 512), MEMO_DB4FREE, 512},
+      {"openoa", 0x8B, 7, "dbt", tests::Db3Header(1), MEMO_DB3, 512},  // 0x8B under Enable OA: dBASE III
+      {"openfpt", 0xF5, 6, "fpt", tests::FptHeader(8, 64), MEMO_FPT, 64},
+      {"opensmt", 0xE5, 8, "smt", tests::SmtHeader(8, 0x00010040), MEMO_SMT, 64},  // the low 16 bits count
+      // The extension in upper case is tried when the lower-case one is missing.
+      {"openup", 0x83, 1, "DBT", tests::Db3Header(1), MEMO_DB3, 512},
+  };
+  for (const Case& c : cases) {
+    MemoTable t(c.stem, c.version, c.dialect, c.ext, c.header);
+    ASSERT_NE(t.db, nullptr) << c.stem;
+    EXPECT_EQ(t.db->memofailed, 0) << c.stem;
+    EXPECT_EQ(t.db->memokind, c.kind) << c.stem;
+    EXPECT_EQ(t.db->memoblksize, c.blksize) << c.stem;
+    EXPECT_EQ(t.db->memooff, 0) << c.stem;
+  }
 }
 
 TEST(MemoOpen, RefusesBadHeadersButKeepsTheTable) {
@@ -84,30 +93,23 @@ TEST(MemoOpen, RefusesBadHeadersButKeepsTheTable) {
 }
 
 TEST(MemoRead, Db3TextEndsAtTheMarkTheEndOfFileOrThe32000Cap) {
-  std::string big(40000, 'x');
   Bytes memo = MemoBytes(tests::Db3Header(200))
                    .At(1, tests::Db3Block("hello\x1A" "after"), 512)
-                   .At(2, tests::Db3Block(big), 512)
+                   .At(2, tests::Db3Block(std::string(40000, 'x')), 512)
                    .At(100, Text("runs to the end"), 512)
                    .Build();
   memo.resize(100 * 512 + 15);  // block 100 has no 0x1A: the file ends inside it
   MemoTable t("read3", 0x83, 1, "dbt", memo);
-  bool ok = false;
-  EXPECT_EQ(t.Get(0, 0, &ok), "");
-  EXPECT_TRUE(ok);
-  EXPECT_EQ(t.Get(1, 0, &ok), "hello");
-  EXPECT_TRUE(ok);
-  EXPECT_EQ(t.Get(2, 0, &ok), std::string(32000, 'x'));
-  EXPECT_TRUE(ok);
-  EXPECT_EQ(t.Get(100, 0, &ok), "runs to the end");
-  EXPECT_TRUE(ok);
-  // A block at or past the end of the file is a damaged pointer.
-  EXPECT_EQ(t.Get(101, 0, &ok), "");
-  EXPECT_FALSE(ok);
+  ExpectReads(t, {{0, 0, "", true},
+                  {1, 0, "hello", true},
+                  {2, 0, std::string(32000, 'x'), true},
+                  {100, 0, "runs to the end", true},
+                  // A block at or past the end of the file is a damaged
+                  // pointer; so is one whose offset 32 bits can't hold (it
+                  // never wraps onto another memo).
+                  {101, 0, "", false},
+                  {0x00800001, 0, "", false}});
   EXPECT_EQ(t.db->memostat, 1);
-  // A block whose offset 32 bits can't hold never wraps onto another memo.
-  EXPECT_EQ(t.Get(0x00800001, 0, &ok), "");
-  EXPECT_FALSE(ok);
 }
 
 TEST(MemoRead, Db4CountsTheTextByTheLengthWordsAndTrustsNoLength) {
@@ -126,18 +128,11 @@ TEST(MemoRead, Db4CountsTheTextByTheLengthWordsAndTrustsNoLength) {
                    .Build();
   memo.resize(89 * 512 + 12);  // the file ends inside the last memo
   MemoTable t("read4", 0x8B, 2, "dbt", memo);
-  bool ok = false;
-  EXPECT_EQ(t.Get(1, 0, &ok), "hello");
-  EXPECT_TRUE(ok);
-  EXPECT_EQ(t.Get(2, 0, &ok), "abcde");
-  EXPECT_TRUE(ok);
-  EXPECT_EQ(t.Get(4, 0, &ok), big);  // no 32,000 cap outside the dBASE III form
-  EXPECT_TRUE(ok);
-  EXPECT_EQ(t.Get(3, 0, &ok), "");
-  EXPECT_FALSE(ok);
-  // The read ends at the end of the file: the bytes there, and false.
-  EXPECT_EQ(t.Get(89, 0, &ok), "tail");
-  EXPECT_FALSE(ok);
+  ExpectReads(t, {{1, 0, "hello", true},
+                  {2, 0, "abcde", true},
+                  {4, 0, big, true},  // no 32,000 cap outside the dBASE III form
+                  {3, 0, "", false},
+                  {89, 0, "tail", false}});  // the read ends at the end of the file
   EXPECT_EQ(t.db->memostat, 1);
 }
 
@@ -150,12 +145,9 @@ TEST(MemoRead, FptReadsTextBlocksOnlyAndTrustsNoLength) {
                    .At(10, huge, 64)
                    .Build();
   MemoTable t("readfpt", 0xF5, 6, "fpt", memo);
-  bool ok = false;
-  EXPECT_EQ(t.Get(8, 0, &ok), "fox text");
-  EXPECT_TRUE(ok);
-  EXPECT_EQ(t.Get(9, 0, &ok), "");
-  EXPECT_FALSE(ok);
+  ExpectReads(t, {{8, 0, "fox text", true}, {9, 0, "", false}});
   EXPECT_EQ(t.db->memostat, 0);  // not text: the caller shows a blank field
+  bool ok = true;
   t.Get(10, 0, &ok);
   EXPECT_FALSE(ok);
   EXPECT_EQ(t.db->memostat, 1);  // damage, not "no text"
@@ -164,13 +156,10 @@ TEST(MemoRead, FptReadsTextBlocksOnlyAndTrustsNoLength) {
 TEST(MemoRead, SmtTakesTheLengthFromThePointer) {
   Bytes memo = MemoBytes(tests::SmtHeader(10, 64)).At(8, Text("clipper memo text"), 64).Build();
   MemoTable t("readsmt", 0xE5, 8, "smt", memo);
-  bool ok = false;
-  EXPECT_EQ(t.Get(8, 7, &ok), "clipper");
-  EXPECT_TRUE(ok);
-  EXPECT_EQ(t.Get(12345, 0, &ok), "");  // length 0: no memo, no file access
-  EXPECT_TRUE(ok);
-  EXPECT_EQ(t.Get(8, 1000, &ok).size(), 64u);  // a length past the end reads what is there
-  EXPECT_FALSE(ok);
+  ExpectReads(t, {{8, 7, "clipper", true},
+                  {12345, 0, "", true},  // length 0: no memo, no file access
+                  // A length past the end reads what is there.
+                  {8, 1000, "clipper memo text" + std::string(64 - 17, '\0'), false}});
 }
 
 TEST(MemoBlockNumber, TextFormOfThePointer) {

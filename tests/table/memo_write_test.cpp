@@ -167,25 +167,17 @@ TEST(MemoWrite, RunEndedBy0xFFFFIsUsedOnlyWhenItHoldsTheMemo) {
 }
 
 TEST(MemoWrite, FptFirstMemoLiesInsideTheHeader) {
-  std::string path = tests::MemoScratch("wfpt.dbf");
-  ZQDBFIELD f1{"NOTES", 'M', 10, 0};
-  ZQDBFIELD* defs[] = {&f1};
-  ASSERT_EQ(dbcreat(path.c_str(), 1, defs, DIALECT_FOXPRO | 0x8000, false), 0);
-  ZQDBFIELD* fields[kMaxFields] = {};
-  int v = DIALECT_FOXPRO;
-  ZQDBFILE* db = dbopen(nullptr, path.c_str(), fields, &v, true);
-  ASSERT_NE(db, nullptr);
-  ASSERT_EQ(db->memofailed, 0);
-  EXPECT_EQ(putmemo(db, 0, ZQString("hello")), 1u);
-  EXPECT_EQ(putmemo(db, 0, ZQString(std::string(200, 'w').c_str())), 2u);  // 2 blocks
-  EXPECT_EQ(putmemo(db, 0, ZQString("x")), 4u);
-  db->memofile.flush();
-  Bytes m = tests::ReadFile(tests::MemoScratch("wfpt.fpt"));
+  // A new FoxPro memo file: next block 1 of 128 bytes, big-endian.
+  MemoTable t("wfpt", 0xF5, 6, "fpt", tests::FptHeader(1, 128));
+  ASSERT_EQ(t.db->memofailed, 0);
+  EXPECT_EQ(t.Put(0, "hello"), 1u);
+  EXPECT_EQ(t.Put(0, std::string(200, 'w')), 2u);  // 2 blocks
+  EXPECT_EQ(t.Put(0, "x"), 4u);
+  Bytes m = t.MemoFile();
   ASSERT_EQ(m.size(), 640u);
-  EXPECT_EQ(Be32At(m, 0), 5u);  // big-endian
+  EXPECT_EQ(Be32At(m, 0), 5u);
   EXPECT_EQ(Slice(m, 128, 13), (Bytes{0, 0, 0, 1, 0, 0, 0, 5, 'h', 'e', 'l', 'l', 'o'}));
   EXPECT_EQ(Slice(m, 141, 115), Bytes(115, 0));
-  dbclose(fields, db);
 
   // An old block that isn't text can't be replaced: 0, and memostat 0.
   MemoTable pic("wfptpic", 0xF5, 6, "fpt",
@@ -195,29 +187,17 @@ TEST(MemoWrite, FptFirstMemoLiesInsideTheHeader) {
 }
 
 TEST(MemoWrite, SmtAdvancesByTheTextAloneAndKeepsLengthsInThePointer) {
-  std::string path = tests::MemoScratch("wsmt.dbf");
-  ZQDBFIELD f1{"NOTES", 'M', 10, 0};
-  ZQDBFIELD* defs[] = {&f1};
-  ASSERT_EQ(dbcreat(path.c_str(), 1, defs, DIALECT_CLIPPER | 0x8000, false), 0);
-  ZQDBFIELD* fields[kMaxFields] = {};
-  int v = DIALECT_CLIPPER;
-  ZQDBFILE* db = dbopen(nullptr, path.c_str(), fields, &v, true);
-  ASSERT_NE(db, nullptr);
-  ASSERT_EQ(db->memokind, MEMO_SMT);
+  MemoTable t("wsmt", 0xE5, 8, "smt", tests::SmtHeader(8, 64));  // a new Clipper memo file
+  ASSERT_EQ(t.db->memokind, MEMO_SMT);
   std::string t128(128, 's');
-  EXPECT_EQ(putmemo(db, 0, ZQString(t128.c_str())), 8u);
-  db->memofile.flush();
-  Bytes m = tests::ReadFile(tests::MemoScratch("wsmt.smt"));
+  EXPECT_EQ(t.Put(0, t128), 8u);
+  Bytes m = t.MemoFile();
   ASSERT_EQ(m.size(), 512u + 192u);  // three blocks written
   EXPECT_EQ(Le32At(m, 0), 10u);     // two counted
   EXPECT_EQ(Slice(m, 640, 64), Bytes(64, 0));
-  EXPECT_EQ(putmemo(db, 0, ZQString("abc")), 10u);  // on the zero block
-  ZQString text;
-  EXPECT_TRUE(getmemo(db, 8, 128, text));
-  EXPECT_EQ(std::string(text.c_str()), t128);
-  EXPECT_TRUE(getmemo(db, 10, 3, text));
-  EXPECT_EQ(std::string(text.c_str()), "abc");
-  dbclose(fields, db);
+  EXPECT_EQ(t.Put(0, "abc"), 10u);  // on the zero block
+  EXPECT_EQ(t.Get(8, 128), t128);
+  EXPECT_EQ(t.Get(10, 3), "abc");
 }
 
 TEST(MemoWrite, DamagedOldMemosAndHeadersAreNotWrittenOver) {

@@ -93,16 +93,6 @@ TEST(Create, WideHeaderWithMemoFieldsAndProductionFlag) {
                           {WideDescriptor("NAME", 'C', 10, 0), WideDescriptor("NOTES", 'M', 10, 0),
                            WideDescriptor("AMOUNT", 'N', 8, 2)}));
   EXPECT_EQ(tests::ReadFile(Sibling(path, "dbt")), tests::Db4Header(1, 0x0101, 512, "WIDE4"));
-
-  // Reopened in the same dialect: the same fields, the memo as dBASE IV.
-  tests::OpenedTable t(path, DIALECT_DBASE4);
-  ASSERT_NE(t.db, nullptr);
-  EXPECT_EQ(t.db->fieldcount, 3);
-  EXPECT_STREQ(t.fields[2]->name, "AMOUNT");
-  EXPECT_EQ(t.fields[2]->decimals, 2);
-  EXPECT_EQ(t.fields[1]->length, 10);
-  EXPECT_EQ(t.db->memokind, MEMO_DB4);
-  EXPECT_EQ(t.db->memofailed, 0);
 }
 
 TEST(Create, MemoHeaderOfEachKind) {
@@ -263,28 +253,6 @@ TEST(CreateVfp, HeaderFlagsWidthsAndMemoFile) {
     EXPECT_EQ(t.fields[0]->length, c.header[32 + 16]);
     EXPECT_EQ(t.db->memofailed, 0);
   }
-
-  // The memo engine fills the FPT file from block 8, 64 bytes a block, the
-  // header's word big-endian; a text that fits its old blocks stays where it
-  // is, a longer one goes to the end and its old blocks are lost.
-  std::string fpt = tests::ScratchPath("vfp_memo.fpt");
-  {
-    tests::MemoTable t(tests::ScratchPath("vfp_memo.dbf"), DIALECT_VFOXPRO);
-    ASSERT_NE(t.db, nullptr);
-    EXPECT_EQ(t.db->memoblksize, 64);
-    EXPECT_EQ(t.Put(0, "first"), 8u);
-    EXPECT_EQ(t.Put(0, std::string(100, 'x')), 9u);  // (100 + 8) / 64 + 1 = 2 blocks
-    EXPECT_EQ(t.Put(8, "first, longer"), 8u);
-    EXPECT_EQ(t.Put(8, std::string(70, 'y')), 11u);
-    EXPECT_EQ(deloldm(t.db, 11, 2), 0);  // nothing to free in this kind
-    EXPECT_EQ(t.Get(11), std::string(70, 'y'));
-  }
-  Bytes memo = tests::ReadFile(fpt);
-  ASSERT_EQ(memo.size(), 13u * 64);
-  EXPECT_EQ(Bytes(memo.begin(), memo.begin() + 8), (Bytes{0, 0, 0, 13, 0, 0, 0, 64}));
-  Bytes block8 = tests::FptBlock("first, longer");
-  block8.resize(64, 0);
-  EXPECT_EQ(Bytes(memo.begin() + 512, memo.begin() + 576), block8);
 }
 
 TEST(Put, AppendsRewritesAndCloseStampsTheCount) {

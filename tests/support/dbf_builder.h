@@ -14,6 +14,7 @@
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
+#include <filesystem>
 #include <fstream>
 #include <iterator>
 #include <string>
@@ -28,8 +29,7 @@ using Bytes = std::vector<uint8_t>;
 struct FieldSpec {
   std::string name;
   char type;
-  int length;
-  int decimals;
+  int length, decimals;
 };
 
 class DbfBuilder {
@@ -170,13 +170,11 @@ inline Bytes NumberedTable(int count, const std::vector<int>& deleted) {
 // others' files. The directory goes when the process ends.
 inline std::string ScratchPath(const std::string& name) {
   static const std::string dir = [] {
-    std::string d = "/tmp/zqdbse-tests-" + std::to_string(getpid());
+    static const std::string d = "/tmp/zqdbse-tests-" + std::to_string(getpid());
     mkdir(d.c_str(), 0700);
-    static std::string to_remove = d;
     atexit([] {
-      std::string rm = "rm -rf '" + to_remove + "'";
-      if (system(rm.c_str()) != 0) {
-      }
+      std::error_code ignored;
+      std::filesystem::remove_all(d, ignored);
     });
     return d;
   }();

@@ -26,13 +26,11 @@ struct OpenedTable {
   OpenedTable(const std::string& path, int dialect, bool writable = false) : version(dialect) {
     db = dbopen(nullptr, path.c_str(), fields, &version, writable);
   }
-  ~OpenedTable() {
-    if (db != nullptr) dbclose(fields, db);
-  }
+  ~OpenedTable() { Close(); }
   OpenedTable(const OpenedTable&) = delete;
   OpenedTable& operator=(const OpenedTable&) = delete;
   int Close() {
-    int rc = dbclose(fields, db);
+    int rc = db != nullptr ? dbclose(fields, db) : -1;
     db = nullptr;
     return rc;
   }

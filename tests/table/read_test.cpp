@@ -138,22 +138,17 @@ TEST(ReadOpenTest, FirstRecordLiesWhereTheHeaderSays) {
 }
 
 TEST(ReadOpenTest, SkippedHeaderBytesDontCount) {
-  // Narrow descriptor: name, type, length, two skipped bytes, decimals. Wide:
-  // the skipped areas of header and descriptor, and a name of all 11 bytes
+  // The skipped areas of header and descriptor, and a name of all 11 bytes
   // (no NUL in the file), read whole and ended there.
-  Bytes narrow = DbfBuilder(0x02, true).Field("PRICE", 'N', 7, 2).Build();
-  narrow[kNarrowFields + 13] = narrow[kNarrowFields + 14] = 0xEE;
-  Bytes wide = DbfBuilder(0x03).Field("ABCDEFGHIJK", 'N', 7, 2).Build();
-  for (int i = 12; i < 32; ++i) wide[size_t(i)] = 0xAA;
-  for (int i = 12; i < 16; ++i) wide[size_t(kWideFields + i)] = 0xBB;
-  for (int i = 18; i < 32; ++i) wide[size_t(kWideFields + i)] = 0xCC;
-  for (const Bytes& bytes : {narrow, wide}) {
-    Opened t(tests::WriteScratch("open_skipped.dbf", bytes), bytes[0] == 0x02 ? 0 : 2);
-    ASSERT_NE(t.db, nullptr);
-    const ZQDBFIELD& f = *t.fields[0];
-    EXPECT_EQ(std::string(f.name) + char(f.type) + std::to_string(f.length) + "," + std::to_string(f.decimals),
-              bytes[0] == 0x02 ? "PRICEN7,2" : "ABCDEFGHIJKN7,2");
-  }
+  Bytes bytes = DbfBuilder(0x03).Field("ABCDEFGHIJK", 'N', 7, 2).Build();
+  for (int i = 12; i < 32; ++i) bytes[size_t(i)] = 0xAA;
+  for (int i = 12; i < 16; ++i) bytes[size_t(kWideFields + i)] = 0xBB;
+  for (int i = 18; i < 32; ++i) bytes[size_t(kWideFields + i)] = 0xCC;
+  Opened t(tests::WriteScratch("open_skipped.dbf", bytes), 2);
+  ASSERT_NE(t.db, nullptr);
+  const ZQDBFIELD& f = *t.fields[0];
+  EXPECT_EQ(std::string(f.name) + char(f.type) + std::to_string(f.length) + "," + std::to_string(f.decimals),
+            "ABCDEFGHIJKN7,2");
 }
 
 TEST(ReadOpenTest, FieldLimitsStopTheDescriptorsNotTheRecords) {
@@ -234,40 +229,12 @@ TEST(ReadOpenTest, DamagedHeadersAreRefused) {
 const Bytes kThree = DbfBuilder(0x03).Field("ID", 'C', 3).Field("N", 'N', 2).Record({"abc", "1"})
                          .Deleted({"def", "2"}).Record({"ghi", "3"}).Build();
 
-TEST(ReadGetTest, RecordsFlagsAndTheBoundOnTheNumber) {
-  Opened t(tests::WriteScratch("get_three.dbf", kThree), 2);
-  ASSERT_NE(t.db, nullptr);
-  ASSERT_EQ(t.db->reccount, 3);
-  char buf[5];
-  int live = -1;
-  // In order, then out of order (the position is found again), and after
-  // failed reads (they spoil nothing): the bytes, the flag, and the position
-  // behind the record, where a read in sequence goes on without a seek.
-  const std::string all = "abc1 def2 ghi3 ";
-  for (int32_t r : {0, 1, 2, 0, -1, 4, 3, 2}) {
-    SCOPED_TRACE(r);
-    if (r < 0 || r > 3) {  // outside the bound: -1 without a read
-      EXPECT_EQ(dbget(t.db, r, buf, &live), -1);
-    } else if (r == 3) {
-      // recno equal to the count passes the bound and reads behind the last
-      // record: the end mark, then nothing, so a dead record and 0.
-      EXPECT_EQ(dbget(t.db, r, buf, &live), 0);
-      EXPECT_EQ(live, 0);
-      EXPECT_EQ(t.db->filepos, -1);
-    } else {
-      ASSERT_EQ(dbget(t.db, r, buf, &live), 0);
-      EXPECT_EQ(std::string(buf, 5), all.substr(size_t(r) * 5, 5));
-      EXPECT_EQ(live, r == 1 ? 0 : 1);
-      EXPECT_EQ(t.db->filepos, 97 + 6 * (r + 1));
-    }
-  }
-}
-
 TEST(ReadGetTest, RecordsCutByTheEndOfTheFile) {
   // The header counts 3 records; the file ends inside record 2, right behind
   // its live flag (no record bytes came: no record, whatever the flag says),
-  // or before it (no end mark either). A cut record gives the count of bytes
-  // that came.
+  // or before it (no end mark either). Whole records come with their flag and
+  // leave the position behind them; a cut record gives the count of bytes
+  // that came; a number outside 0 to the count gives -1 without a read.
   struct Case {
     size_t size;
     int rc;
@@ -280,12 +247,19 @@ TEST(ReadGetTest, RecordsCutByTheEndOfTheFile) {
     ASSERT_NE(t.db, nullptr);
     char buf[5];
     int live = -1;
-    ASSERT_EQ(dbget(t.db, 1, buf, &live), 0);
+    for (int32_t r : {0, 1}) {
+      ASSERT_EQ(dbget(t.db, r, buf, &live), 0);
+      EXPECT_EQ(std::string(buf, 5), r == 0 ? "abc1 " : "def2 ");
+      EXPECT_EQ(live, 1 - r);
+      EXPECT_EQ(t.db->filepos, 97 + 6 * (r + 1));
+    }
     EXPECT_EQ(dbget(t.db, 2, buf, &live), c.rc);
     if (c.live >= 0) {
       EXPECT_EQ(live, c.live);
     }
     EXPECT_EQ(t.db->filepos, -1);
+    EXPECT_EQ(dbget(t.db, 4, buf, &live), -1);
+    EXPECT_EQ(dbget(t.db, -1, buf, &live), -1);
   }
 }
 

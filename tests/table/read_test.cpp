@@ -103,40 +103,6 @@ TEST(ReadOpenTest, MemoKindFollowsTheVersionByte) {
   EXPECT_EQ(vfp.db->memokind, MEMO_FPT);
 }
 
-TEST(ReadOpenTest, FirstRecordLiesWhereTheHeaderSays) {
-  // Narrow, 32 fields or fewer: always 32 descriptors' room, first record at
-  // 521; 33 fields (Enable only): the terminator is the last header byte, at
-  // 16n + 9. Wide: the header length at offsets 8 and 9 as written (Visual
-  // FoxPro keeps 263 bytes behind the terminator, here even 0x0D bytes).
-  Bytes vfp = DbfBuilder(0x30).Field("ID", 'C', 3).Field("QTY", 'N', 4).HeaderExtra(263)
-                  .Record({"abc", "  12"}).Record({"def", "  34"}).Build();
-  for (int i = 97; i < 360; ++i) vfp[size_t(i)] = 0x0D;
-  struct Case {
-    Bytes bytes;
-    int dialect;
-    int hdrlen;
-    int fieldcount;
-    std::string last;  // the last record, flag left out
-  } cases[] = {
-      {OneByteFields(0x02, 32, "wx", true).Build(), 0, 521, 32, std::string(32, 'x')},
-      {OneByteFields(0x02, 33, "y", true).Build(), 3, 537, 33, std::string(33, 'y')},
-      {vfp, 10, 360, 2, "def  34"},
-  };
-  for (const Case& c : cases) {
-    SCOPED_TRACE(c.hdrlen);
-    Opened t(tests::WriteScratch("open_first.dbf", c.bytes), c.dialect);
-    ASSERT_NE(t.db, nullptr);
-    EXPECT_EQ(t.db->hdrlen, c.hdrlen);
-    EXPECT_EQ(t.db->fieldcount, c.fieldcount);
-    EXPECT_EQ(t.db->reclen, c.last.size() + 1);
-    std::string buf(c.last.size(), '?');
-    int live = 0;
-    ASSERT_EQ(dbget(t.db, t.db->reccount - 1, &buf[0], &live), 0);
-    EXPECT_EQ(live, 1);
-    EXPECT_EQ(buf, c.last);
-  }
-}
-
 TEST(ReadOpenTest, SkippedHeaderBytesDontCount) {
   // The skipped areas of header and descriptor, and a name of all 11 bytes
   // (no NUL in the file), read whole and ended there.

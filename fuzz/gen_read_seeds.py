@@ -13,9 +13,9 @@ import struct
 OUT = os.path.join(os.path.dirname(os.path.abspath(__file__)), "corpus", "read")
 
 
-def table(version, fields, records, count=None, extra=0, end_mark=True, narrow=False):
+def table(version, fields, records, count=None, extra=0, end_mark=True, narrow=False, reclen=None):
     """fields: (name, type, length, decimals); records: bytes with flag."""
-    reclen = 1 + sum(f[2] for f in fields)
+    reclen = reclen or 1 + sum(f[2] for f in fields)
     n = len(records) if count is None else count
     if narrow:
         out = bytearray(struct.pack("<BHBBBH", version, n, 1, 24, 2, reclen))
@@ -78,16 +78,10 @@ def seeds():
     yield "vfp.dbf", table(0x30, vfp_fields, vfp_rows, extra=263)
     yield "count_beyond.dbf", table(0x03, [("ID", "C", 2, 0)], [rec(b"p0"), rec(b"p1")], count=1000,
                                     end_mark=False)
-    yield "field_past.dbf", _field_past()
-    yield "empty.dbf", table(0x03, PLAIN, [], end_mark=False)
-
-
-def _field_past():
     # Fields of 3 + 4 bytes in records of 1 + 5: the second runs past.
-    t = bytearray(table(0x03, [("A", "C", 3, 0), ("B", "C", 4, 0)], []))
-    struct.pack_into("<H", t, 10, 6)
-    t = t[:-1] + rec(b"abcde") + rec(b"fghij") + b"\x1a"
-    return bytes(t)
+    yield "field_past.dbf", table(0x03, [("A", "C", 3, 0), ("B", "C", 4, 0)], [rec(b"abcde"), rec(b"fghij")],
+                                  reclen=6)
+    yield "empty.dbf", table(0x03, PLAIN, [], end_mark=False)
 
 
 def main():

@@ -84,17 +84,6 @@ Bytes WideHeader(uint8_t version, uint16_t reclen, uint8_t flags, std::initializ
   return h;
 }
 
-TEST(Create, WideHeaderWithMemoFieldsAndProductionFlag) {
-  Fields f = {{"NAME", 'C', 10, 0}, {"NOTES", 'M', 4, 0}, {"AMOUNT", 'N', 8, 2}};
-  std::string path = Create("wide4.dbf", f, DIALECT_DBASE4 | kMemo, true);
-  Bytes b = tests::ReadFile(path);
-  TakeDate(b, 3, 2, 1);
-  EXPECT_EQ(b, WideHeader(0x8B, 29, 1,
-                          {WideDescriptor("NAME", 'C', 10, 0), WideDescriptor("NOTES", 'M', 10, 0),
-                           WideDescriptor("AMOUNT", 'N', 8, 2)}));
-  EXPECT_EQ(tests::ReadFile(Sibling(path, "dbt")), tests::Db4Header(1, 0x0101, 512, "WIDE4"));
-}
-
 TEST(Create, MemoHeaderOfEachKind) {
   struct Case {
     int dialect;
@@ -195,21 +184,31 @@ TEST(Create, WideEdgeCases) {
   EXPECT_EQ(t.db->memofailed, 0);
 }
 
-TEST(CreateVfp, HeaderFlagsWidthsAndMemoFile) {
-  // The caller's widths of the binary forms don't count: I is 4, B, T and Y
-  // 8, M and G 4. The flags say production index (1) and memo fields (2).
-  // "B" is a double in the record, not a memo; a caller that marks a table of
-  // doubles as having memos (as the target does in every dialect) gets an
-  // empty FPT file all the same, since the table's own open looks for one
-  // whenever a "B" field is there, but its flags say it has no memo fields.
+TEST(Create, WideHeaderFlagsWidthsAndMemoFile) {
+  // dBASE IV: the production flag 1 at 28, the terminator and one zero. Visual
+  // FoxPro: the caller's widths of the binary forms don't count (I is 4, B, T
+  // and Y 8, M and G 4), displacements in the descriptors, flags for a
+  // production index (1) and memo fields (2), 263 bytes behind the
+  // terminator. "B" is a double in the record, not a memo; a caller that
+  // marks a table of doubles as having memos (as the target does in every
+  // dialect) gets an empty FPT file all the same, since the table's own open
+  // looks for one whenever a "B" field is there, but its flags say it has no
+  // memo fields.
   struct Case {
     const char* file;
     Fields fields;
     int dialect;
     bool production;
     Bytes header;
-    bool fpt;
+    const char* ext;  // of the memo file, if any
+    Bytes memo;
   } cases[] = {
+      {"wide4.dbf", {{"NAME", 'C', 10, 0}, {"NOTES", 'M', 4, 0}, {"AMOUNT", 'N', 8, 2}}, DIALECT_DBASE4 | kMemo,
+       true,
+       WideHeader(0x8B, 29, 1,
+                  {WideDescriptor("NAME", 'C', 10, 0), WideDescriptor("NOTES", 'M', 10, 0),
+                   WideDescriptor("AMOUNT", 'N', 8, 2)}),
+       "dbt", tests::Db4Header(1, 0x0101, 512, "WIDE4")},
       {"vfp_plain.dbf",
        {{"ID", 'I', 11, 0}, {"NAME", 'C', 10, 0}, {"WHEN", 'T', 19, 0}, {"PRICE", 'Y', 20, 4},
         {"AMOUNT", 'N', 8, 2}},
@@ -219,7 +218,7 @@ TEST(CreateVfp, HeaderFlagsWidthsAndMemoFile) {
                    WideDescriptor("WHEN", 'T', 8, 0, 15), WideDescriptor("PRICE", 'Y', 8, 4, 23),
                    WideDescriptor("AMOUNT", 'N', 8, 2, 31)},
                   263),
-       false},
+       "", {}},
       {"vfp_memo.dbf",
        {{"NAME", 'C', 10, 0}, {"NOTES", 'M', 10, 0}, {"PIC", 'G', 10, 0}, {"RATE", 'B', 10, 0}},
        DIALECT_VFOXPRO | kMemo, true,
@@ -227,9 +226,9 @@ TEST(CreateVfp, HeaderFlagsWidthsAndMemoFile) {
                   {WideDescriptor("NAME", 'C', 10, 0, 1), WideDescriptor("NOTES", 'M', 4, 0, 11),
                    WideDescriptor("PIC", 'G', 4, 0, 15), WideDescriptor("RATE", 'B', 8, 0, 19)},
                   263),
-       true},
+       "fpt", tests::FptHeader(8, 64)},
       {"vfp_double.dbf", {{"RATE", 'B', 8, 0}}, DIALECT_VFOXPRO | kMemo, false,
-       WideHeader(0x30, 9, 0x00, {WideDescriptor("RATE", 'B', 8, 0, 1)}, 263), true},
+       WideHeader(0x30, 9, 0x00, {WideDescriptor("RATE", 'B', 8, 0, 1)}, 263), "fpt", tests::FptHeader(8, 64)},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.file);
@@ -237,13 +236,13 @@ TEST(CreateVfp, HeaderFlagsWidthsAndMemoFile) {
     Bytes b = tests::ReadFile(path);
     TakeDate(b, 3, 2, 1);
     EXPECT_EQ(b, c.header);
-    EXPECT_FALSE(ZQFileProxy::fileExists(Sibling(path, "dbt").c_str()));
-    EXPECT_EQ(ZQFileProxy::fileExists(Sibling(path, "fpt").c_str()), c.fpt);
-    if (c.fpt) {
-      EXPECT_EQ(tests::ReadFile(Sibling(path, "fpt")), tests::FptHeader(8, 64));
+    for (const char* ext : {"dbt", "fpt"}) {
+      bool made = std::string(ext) == c.ext;
+      EXPECT_EQ(ZQFileProxy::fileExists(Sibling(path, ext).c_str()), made) << ext;
+      EXPECT_EQ(tests::ReadFile(Sibling(path, ext)), made ? c.memo : Bytes()) << ext;
     }
     // Its own open takes it: the header length is read, not recomputed.
-    tests::OpenedTable t(path, DIALECT_VFOXPRO);
+    tests::OpenedTable t(path, c.dialect & ~kMemo);
     ASSERT_NE(t.db, nullptr);
     EXPECT_EQ(t.db->hdrlen, int(c.header.size()));
     EXPECT_EQ(t.db->fieldcount, int(c.fields.size()));

@@ -56,11 +56,14 @@ printf 'NAME,NOTE\nann,fine\nbob,"unterminated\n' >badmemo.csv
 expect_run 1 convert badmemo.csv keepm.dbf --schema "NAME C(10), NOTE M"
 ok "replace mode with a bad record changed the old table" cmp -s tables <(cksum keep.dbf keepm.dbf keepm.dbt)
 
-# Text in a D field of the table: an error, not a value lost without a word
-# (text in N: failed_append.sh).
+# Text in a D field of the table, or from a table's C field in an N field:
+# an error, not a value lost without a word (text of a CSV file in N:
+# failed_append.sh).
 expect_run 0 convert good.csv app.dbf --schema "$SCHEMA" && cp app.dbf app.before
 printf 'NAME,QTY,BORN\ncat,3,hello\n' >textdate.csv
 expect_run 1 convert textdate.csv app.dbf --mode append && err_has "BORN"
+printf 'NAME,QTY,BORN\ncat,abc,2021-01-01\n' >textnum.csv && "$ZQDB" convert textnum.csv textnum.dbf
+expect_run 1 convert textnum.dbf app.dbf --mode append && expect_err 'zqdb: record 1, field QTY: "abc" doesn'"'"'t fit a N(5) field'
 same_file app.dbf app.before
 
 # Text that looks like a logical or a number stays as it is in a text field

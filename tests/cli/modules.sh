@@ -12,6 +12,8 @@ printf 'NAME,NOTE\nann,%s\n' "$(head -c 300 /dev/zero | tr '\0' 'x')" >"$WORK/in
 expect_run 0 convert "$WORK/in.csv" "$WORK/fox.dbf" --type foxpro --no-progress
 expect_run 0 info "$WORK/fox.dbf" && expect_out "dialect:     6 (FoxPro)" && expect_out "version:     0xF5" &&
   expect_out "fox.fpt (FoxPro"
+# A table is read in the dialect of the definition: Visual FoxPro's refuses it.
+expect_run 1 cat "$WORK/fox.dbf" --type vfoxpro && expect_err "zqdb: Error opening data file"
 # --to wins over the dialect of the definition --type picks.
 expect_run 0 convert "$WORK/in.csv" "$WORK/db4.dbf" --type vfoxpro --to 2 --no-progress &&
   "$ZQDB" info "$WORK/db4.dbf" >"$OUT" && expect_out "dialect:     2 (dBASE IV)"

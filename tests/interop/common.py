@@ -178,8 +178,7 @@ class Suite:
 
     def __init__(self, name):
         self.name = name
-        self.passed = 0
-        self.failed = 0
+        self.passed = self.failed = 0
 
     def check(self, label, ok, detail=""):
         if ok:
@@ -215,14 +214,9 @@ class Suite:
             self.check(label + " record count", len(zrows) == len(rrows),
                        "zqdb %d, dbfread %d" % (len(zrows), len(rrows)))
             letters = {f[0]: f[1] for f in rf}
-            bad = []
-            for i, (z, r) in enumerate(zip(zrows, rrows)):
-                if list(z.keys()) != list(r.keys()):
-                    bad.append("record %d keys %s vs %s" % (i, list(z.keys()), list(r.keys())))
-                    continue
-                for k in r:
-                    if not same_value(letters[k], z[k], r[k]):
-                        bad.append("record %d %s: zqdb %r, dbfread %r" % (i, k, z[k], r[k]))
+            bad = ["record %d %s: zqdb %r, dbfread %r" % (i, k, z.get(k, "<none>"), r[k])
+                   for i, (z, r) in enumerate(zip(zrows, rrows)) for k in r
+                   if list(z) != list(r) or not same_value(letters[k], z[k], r[k])]
             self.check(label + " values", not bad, "; ".join(bad[:8]) + (" ..." if len(bad) > 8 else ""))
             return zrows
         return []

@@ -7,21 +7,19 @@ import os
 import sys
 
 sys.path.insert(0, os.path.dirname(os.path.abspath(__file__)))
-from common import ZQDB, Suite, must, run, workdir  # noqa: E402
+from common import ZQDB, Suite, must, run, workdir, write_csv  # noqa: E402
 from databases import DIALECTS, compare, make_corpus  # noqa: E402
 
 s = Suite("sqlite")
 
 
 def sqlite_rows(db, table):
-    rc, out, err = run(["sqlite3", "-json", db, 'SELECT * FROM "%s" ORDER BY rowid' % table])
-    if rc != 0:
-        raise AssertionError("sqlite3: %s" % err.strip())
+    out = must(["sqlite3", "-json", db, 'SELECT * FROM "%s" ORDER BY rowid' % table])
     return json.loads(out) if out.strip() else []
 
 
 def sqlite_types(db, table):
-    rc, out, _ = run(["sqlite3", db, 'SELECT name, type FROM pragma_table_info("%s")' % table])
+    out = must(["sqlite3", db, 'SELECT name, type FROM pragma_table_info("%s")' % table])
     return dict(line.split("|") for line in out.splitlines())
 
 
@@ -50,10 +48,8 @@ with workdir() as d:
         # 75 rows: two statements of 32 rows and one of 11, into a new
         # database and again into the same table.
         many = os.path.join(d, "many.csv")
-        with open(many, "w") as f:
-            f.write("ID,NAME,AMOUNT\n")
-            for i in range(75):
-                f.write('%d,"row %d ""q"" \\",%s\n' % (i, i, "" if i % 7 == 0 else "%d.25" % i))
+        write_csv(many, ("ID", "NAME", "AMOUNT"),
+                  [(i, 'row %d "q" \\' % i, "" if i % 7 == 0 else "%d.25" % i) for i in range(75)])
         table = os.path.join(d, "many.dbf")
         must([ZQDB, "convert", many, table, "--no-progress"])
         db = os.path.join(d, "many.sqlite")

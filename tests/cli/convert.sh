@@ -63,7 +63,8 @@ expect_run 0 convert good.csv app.dbf --schema "$SCHEMA" && cp app.dbf app.befor
 printf 'NAME,QTY,BORN\ncat,3,hello\n' >textdate.csv
 expect_run 1 convert textdate.csv app.dbf --mode append && err_has "BORN"
 printf 'NAME,QTY,BORN\ncat,abc,2021-01-01\n' >textnum.csv && "$ZQDB" convert textnum.csv textnum.dbf
-expect_run 1 convert textnum.dbf app.dbf --mode append && expect_err 'zqdb: record 1, field QTY: "abc" doesn'"'"'t fit a N(5) field'
+expect_run 1 convert textnum.dbf app.dbf --mode append &&
+  expect_err 'zqdb: record 1, field QTY: "abc" doesn'"'"'t fit a N(5) field'
 same_file app.dbf app.before
 
 # Text that looks like a logical or a number stays as it is in a text field

@@ -78,7 +78,8 @@ field() { printf '%s' "$1"; zeros $((11 - ${#1})); printf '%s' "$2"; zeros 4; by
 # make_table PATH [VERSION]: a dBASE III table (version 03 unless given) with
 # NAME C(10) and QTY N(5,0); two records, the second deleted.
 make_table() {
-  { dbf_header "${2:-03}" 2 97 16; field NAME C 10; field QTY N 5; printf '\r alice        42*bob           7\x1a'; } >"$1"
+  { dbf_header "${2:-03}" 2 97 16; field NAME C 10; field QTY N 5
+    printf '\r alice        42*bob           7\x1a'; } >"$1"
 }
 
 finish() {

@@ -24,7 +24,8 @@ expect_run 2 cat "$WORK/fox.dbf" --type nosuch && expect_err "no connector defin
 mkdir -p "$WORK/mods"
 module=$(dirname "$ZQDB")/libzqdbse.so
 cp "$module" "$WORK/mods/libgood.so"
-{ head -c 2000 "$module"; tail -c 1212 "$module" | head -c 1196; zeros 4; tail -c 12 "$module"; } >"$WORK/mods/libcut.so"
+{ head -c 2000 "$module"; tail -c 1212 "$module" | head -c 1196; zeros 4; tail -c 12 "$module"; } \
+  >"$WORK/mods/libcut.so"
 ZQDB_MODULE_PATH="$WORK/mods" expect_run 0 formats && expect_out "$WORK/mods/libgood.so" &&
   err_has "libcut.so is skipped"
 expect_run 0 --modules "$WORK/mods" cat "$WORK/fox.dbf" --format jsonl && expect_out '"NAME":"ann"'

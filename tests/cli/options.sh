@@ -59,7 +59,8 @@ expect_run 0 cat "$WORK/db2.dbf" --format jsonl && expect_out '{"NAME":"hello"}'
 # --- Tables that can't be read: status 1, "zqdb: Error opening data file" ----
 # (each reason's own message is checked in usage.sh); cat prints nothing.
 head -c 50 "$WORK/t.dbf" >"$WORK/cut.dbf"  # cut inside the field descriptors
-for args in "$WORK/cut.dbf" "$WORK/vfp.dbf --dialect 2" "$WORK/t.dbf --dialect 10" "$WORK/db2.dbf --dialect 2"; do
+for args in "$WORK/cut.dbf" "$WORK/vfp.dbf --dialect 2" "$WORK/t.dbf --dialect 10" \
+  "$WORK/db2.dbf --dialect 2"; do
   # shellcheck disable=SC2086
   expect_run 1 cat $args && expect_err "zqdb: Error opening data file"
   ok "zqdb cat $args: output for a table that can't be read" not test -s "$OUT"

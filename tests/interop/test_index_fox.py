@@ -113,7 +113,8 @@ def change(d, label, table, rng, pool, recs):
     """Append, then update by ID: half the source names records of the table
     (their keys change, and the rebuilt tags hold the new key only), half are
     new."""
-    pool, cdx, csv = pool + ["new %d" % i for i in range(100)], table[:-4] + ".cdx", os.path.join(d, "more.csv")
+    pool, cdx = pool + ["new %d" % i for i in range(100)], table[:-4] + ".cdx"
+    csv = os.path.join(d, "more.csv")
     append_keys(s, d, label + " append", table, cdx, draw(rng, pool, CHANGED), recs)
     ids = rng.sample(sorted(recs), CHANGED // 2) + list(range(len(recs) + 1, len(recs) + 1 + CHANGED // 2))
     rows = [(i, k, status(i)) for i, k in zip(ids, draw(rng, pool, len(ids)))]

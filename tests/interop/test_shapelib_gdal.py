@@ -61,8 +61,8 @@ with workdir() as d:
     if rows:
         s.check("GDAL text", [r["city"] for r in rows] == ["Århus", "Köln", "", "São Paulo", ""],
                 repr([r["city"] for r in rows]))
-        s.check("GDAL dates and nulls", rows[3]["born"] == "2024-02-29" and rows[4]["id"] is None is rows[4]["born"]
-                and rows[4]["amount"] is None, repr(rows[3:]))
+        s.check("GDAL dates and nulls", rows[3]["born"] == "2024-02-29"
+                and rows[4]["id"] is None is rows[4]["born"] and rows[4]["amount"] is None, repr(rows[3:]))
 
     # Without type detection every column is text, 80 wide. The code page of
     # GDAL's tables is in their .cpg file (CP1252, CP850, UTF-8), their

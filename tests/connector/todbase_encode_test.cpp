@@ -4,8 +4,8 @@
 // table gets.
 #include <gtest/gtest.h>
 
+#include <cmath>
 #include <string>
-#include <type_traits>
 #include <vector>
 
 #include "tests/support/todbase_harness.h"
@@ -19,67 +19,74 @@ using tests::ScratchPath;
 using tests::Target;
 using tests::Written;
 
-// Writes one value into a new table with a single numeric field and gives the
-// field's bytes. A value given as text takes the field's text path; a double
-// the parsed path.
-template <typename V>
-std::string Number(int dialect, int width, int decimals, V value) {
+// Writes `text` (nullptr: a blank) or, when `value` is a number, that double
+// into N(width, decimals) of a new table, with NEXT C(2) "ok" behind it; gives
+// the N field's bytes, and checks that the number stayed out of NEXT.
+std::string Number(int dialect, int width, int decimals, const char* text, double value = NAN) {
   Target t(dialect);
   t.Add('N', "N", width, decimals);
+  t.Add('C', "NEXT", 2);
   std::string path = ScratchPath("num.dbf");
   EXPECT_EQ(t.Open(path), 0);
-  if constexpr (std::is_same_v<V, double>) *t[0] = value;
-  else t.Set(0, value);
+  if (std::isnan(value)) t.Set(0, text);
+  else *t[0] = value;
+  t.Set(1, "ok");
   EXPECT_EQ(t.Write(), 0);
   t.Close();
-  return Written(path).Record(0).substr(1);
+  std::string r = Written(path).Record(0);
+  EXPECT_EQ(r.substr(1 + size_t(width)), "ok");
+  return r.substr(1, size_t(width));
 }
 
 TEST(ToDbaseEncodeTest, NumberForms) {
-  // Too wide for N(5): dialect 1 keeps the low digits, dialect 2 goes to the
-  // exponent form, which keeps the magnitude.
-  EXPECT_EQ(Number(1, 5, 0, "123456"), "23456");
-  EXPECT_EQ(Number(1, 5, 0, 123456.0), "23456");
-  EXPECT_EQ(Number(2, 5, 0, "123456"), "1E+05");
-  EXPECT_EQ(Number(2, 5, 0, 123456.0), "1E+05");
-  // A six-character rendering loses its sign, in every dialect.
-  for (int d : {0, 1, 2, 8, 9}) {
-    EXPECT_EQ(Number(d, 5, 0, "-99999"), "99999") << d;
-    EXPECT_EQ(Number(d, 5, 0, -99999.0), "99999") << d;
+  struct Case {
+    int dialect, width, decimals;
+    const char* text;  // written as text, and `value` as a double, where given
+    double value;
+    const char* want;
+  };
+  const double kNone = NAN;
+  const Case cases[] = {
+      // Too wide for N(5): dialect 1 keeps the low digits, dialect 2 goes to
+      // the exponent form, which keeps the magnitude.
+      {1, 5, 0, "123456", 123456, "23456"},
+      {2, 5, 0, "123456", 123456, "1E+05"},
+      // A six-character rendering loses its sign, in every dialect.
+      {0, 5, 0, "-99999", -99999, "99999"},
+      {1, 5, 0, "-99999", -99999, "99999"},
+      {2, 5, 0, "-99999", -99999, "99999"},
+      {8, 5, 0, "-99999", -99999, "99999"},
+      {9, 5, 0, "-99999", -99999, "99999"},
+      // The plain form holds while log10 stays below the width; leading zeros
+      // count for nothing.
+      {2, 5, 0, "99999", 99999, "99999"},
+      {2, 5, 0, "100000", kNone, "1E+05"},
+      {2, 5, 0, "0099999", kNone, "99999"},
+      // A fraction below 1 is plain whatever the width.
+      {8, 3, 1, "0.5", 0.5, "0.5"},
+      {8, 8, 3, "-0.5", kNone, "  -0.500"},
+      // Width 10, 2 decimals: 7 places before the point; P = 10 - 6; no
+      // exponent form in dialect 1.
+      {2, 10, 2, "1234567", 1234567, "1234567.00"},
+      {2, 10, 2, "12345678", 12345678, " 1.235E+07"},
+      {1, 10, 2, "12345678", kNone, "2345678.00"},
+      // Right-justified with blanks, decimals as the field has them; 0 is
+      // plain; wider than the field even so: cut at the field's end.
+      {2, 8, 2, "-1.5", kNone, "   -1.50"},
+      {9, 6, 0, nullptr, 0.0, "     0"},
+      {2, 6, 0, nullptr, 1e300, "1E+300"},
+      {2, 5, 0, nullptr, 1e300, "1E+30"},
+      {2, 4, 0, nullptr, kNone, "    "},  // a blank number is blanks
+  };
+  for (const Case& c : cases) {
+    SCOPED_TRACE(testing::Message() << c.dialect << " " << (c.text ? c.text : "") << " " << c.value);
+    if (c.text != nullptr || std::isnan(c.value)) {
+      EXPECT_EQ(Number(c.dialect, c.width, c.decimals, c.text), c.want);
+    }
+    if (!std::isnan(c.value)) {
+      EXPECT_EQ(Number(c.dialect, c.width, c.decimals, nullptr, c.value), c.want);
+    }
   }
-  // The plain form holds while log10 stays below the width.
-  EXPECT_EQ(Number(2, 5, 0, "99999"), "99999");
-  EXPECT_EQ(Number(2, 5, 0, 99999.0), "99999");
-  EXPECT_EQ(Number(2, 5, 0, "100000"), "1E+05");
-  EXPECT_EQ(Number(2, 5, 0, "0099999"), "99999");  // leading zeros count for nothing
-  // A fraction below 1 is plain whatever the width.
-  EXPECT_EQ(Number(8, 3, 1, "0.5"), "0.5");
-  EXPECT_EQ(Number(8, 3, 1, 0.5), "0.5");
-  EXPECT_EQ(Number(8, 8, 3, "-0.5"), "  -0.500");
-  // Width 10, 2 decimals: 7 places before the point.
-  EXPECT_EQ(Number(2, 10, 2, "1234567"), "1234567.00");
-  EXPECT_EQ(Number(2, 10, 2, 1234567.0), "1234567.00");
-  EXPECT_EQ(Number(2, 10, 2, "12345678"), " 1.235E+07");  // P = 10 - 6
-  EXPECT_EQ(Number(2, 10, 2, 12345678.0), " 1.235E+07");
-  EXPECT_EQ(Number(1, 10, 2, "12345678"), "2345678.00");  // no exponent form in dialect 1
-  // Right-justified with blanks, decimals as the field has them; 0 is plain.
-  EXPECT_EQ(Number(2, 8, 2, "-1.5"), "   -1.50");
-  EXPECT_EQ(Number(9, 6, 0, 0.0), "     0");
-  EXPECT_EQ(Number(2, 6, 0, 1e300), "1E+300");
-  {  // wider than the field even so: cut at the field's end
-    Target t(2);
-    t.Add('N', "N", 5);
-    t.Add('C', "NEXT", 2);
-    std::string path = ScratchPath("num2.dbf");
-    ASSERT_EQ(t.Open(path), 0);
-    *t[0] = 1e300;
-    t.Set(1, "ok");
-    ASSERT_EQ(t.Write(), 0);
-    t.Close();
-    EXPECT_EQ(Written(path).Record(0), " 1E+30ok");
-  }
-  // A blank number is blanks.
-  EXPECT_EQ(Number(2, 4, 0, nullptr), "    ");
 }
 
 TEST(ToDbaseEncodeTest, DatesLogicalsAndFieldBounds) {
@@ -230,35 +237,25 @@ TEST(ToDbaseEncodeTest, WidthsOutsideOneByteAreRefused) {
 
 TEST(ToDbaseEncodeTest, RecordLengthLimit) {
   // 16 fields of 250 make 4000 bytes: valid; one more byte passes the limit.
-  Target t(2);
-  for (int i = 0; i < 16; ++i) t.Add('C', ("C" + std::to_string(i)).c_str(), 250);
-  int at = -1;
-  EXPECT_EQ(t->ValidateLocalRecord(t.Layout(), at), 0);
-  t.Add('L', "ONE");
-  EXPECT_EQ(t->ValidateLocalRecord(t.Layout(), at), ZQ_RECORD_TOO_LONG);
-  EXPECT_EQ(at, 16);
-
   // A memo counts 10, and 4 in dialect 10; the limit is 32767 in 8, 9, 10.
-  Target m2(2);
-  m2.Add('C', "A", 3990);
-  m2.Add('M', "NOTE");
-  EXPECT_EQ(m2->ValidateLocalRecord(m2.Layout(), at), 0);
-  m2.Add('L', "X");
-  EXPECT_EQ(m2->ValidateLocalRecord(m2.Layout(), at), ZQ_RECORD_TOO_LONG);
-  EXPECT_EQ(at, 2);
-  Target m10(10);
-  m10.Add('C', "A", 32763);
-  m10.Add('M', "NOTE");
-  EXPECT_EQ(m10->ValidateLocalRecord(m10.Layout(), at), 0);
-  m10.Add('L', "X");
-  EXPECT_EQ(m10->ValidateLocalRecord(m10.Layout(), at), ZQ_RECORD_TOO_LONG);
-  Target c8(8);
-  c8.Add('C', "A", 32767);
-  EXPECT_EQ(c8->ValidateLocalRecord(c8.Layout(), at), 0);
-  Target c1(1);
-  c1.Add('C', "A", 4001);
-  EXPECT_EQ(c1->ValidateLocalRecord(c1.Layout(), at), ZQ_RECORD_TOO_LONG);
-  EXPECT_EQ(at, 0);
+  struct Case {
+    int dialect, count, width;  // `count` C fields of `width`
+    bool memo, logical;         // then a memo, then a logical
+    int at;                     // the field past the limit, or -1
+  };
+  for (Case c : {Case{2, 16, 250, false, false, -1}, Case{2, 16, 250, false, true, 16},
+                 Case{2, 1, 3990, true, false, -1}, Case{2, 1, 3990, true, true, 2},
+                 Case{10, 1, 32763, true, false, -1}, Case{10, 1, 32763, true, true, 2},
+                 Case{8, 1, 32767, false, false, -1}, Case{1, 1, 4001, false, false, 0}}) {
+    SCOPED_TRACE(std::to_string(c.dialect) + " " + std::to_string(c.width));
+    Target t(c.dialect);
+    for (int i = 0; i < c.count; ++i) t.Add('C', ("C" + std::to_string(i)).c_str(), c.width);
+    if (c.memo) t.Add('M', "NOTE");
+    if (c.logical) t.Add('L', "ONE");
+    int at = -1;
+    EXPECT_EQ(t->ValidateLocalRecord(t.Layout(), at), c.at < 0 ? 0 : ZQ_RECORD_TOO_LONG);
+    EXPECT_EQ(at, c.at);
+  }
 }
 
 TEST(ToDbaseEncodeTest, LayoutThatDiffersFromTheTable) {

@@ -4,42 +4,30 @@
 // shape other programs write (FPT blocks of 128, a _NullFlags column).
 #include <gtest/gtest.h>
 
-#include <cstring>
 #include <string>
 
 #include "host/zqdate.h"
-#include "tests/support/todbase_harness.h"
 #include "tests/support/memo_builder.h"
+#include "tests/support/todbase_harness.h"
 
 namespace {
 
 using tests::Bytes;
-using tests::DbfBuilder;
-using tests::LogCapture;
+using tests::Dbl;
+using tests::FptBlock;
+using tests::Le32;
+using tests::Le64;
+using tests::Rec;
+using tests::ScratchPath;
 using tests::Target;
+using tests::Text;
 
-std::string Le32(uint32_t v) {
-  uint8_t b[4];
-  PutLe32(b, v);
-  return std::string(reinterpret_cast<char*>(b), 4);
-}
-std::string Le64(uint64_t v) {
-  uint8_t b[8];
-  PutLe64(b, v);
-  return std::string(reinterpret_cast<char*>(b), 8);
-}
-std::string Double(double d) {
-  uint64_t bits;
-  memcpy(&bits, &d, 8);
-  return Le64(bits);
-}
-
-// Record n (flag included) of a Visual FoxPro table, by its header.
-std::string VfpRecord(const Bytes& b, int n) {
-  size_t hdr = GetLe16(&b[8]), len = GetLe16(&b[10]);
-  size_t at = hdr + size_t(n) * len;
-  if (at + len > b.size()) return "";
-  return std::string(b.begin() + long(at), b.begin() + long(at + len));
+// Record n of the table at `path`, flag included.
+Bytes RecordAt(const std::string& path, int n) { return Text(tests::Written(path).Record(n)); }
+// Bytes [from, to) of the file at `path`.
+Bytes Slice(const std::string& path, size_t from, size_t to) {
+  Bytes b = tests::ReadFile(path);
+  return to <= b.size() ? Bytes(b.begin() + long(from), b.begin() + long(to)) : Bytes();
 }
 
 // ID I, NAME C(6), NOTE M, WHEN T, RATE B, PRICE Y, BORN D, OK L.
@@ -55,7 +43,7 @@ void AddAll(Target& t) {
 }
 
 TEST(VfpTarget, RecordsInTheFormsTheReadSideDecodes) {
-  std::string path = tests::ScratchPath("vfp_forms.dbf");
+  std::string path = ScratchPath("vfp_forms.dbf");
   {
     Target t(10);
     AddAll(t);
@@ -77,17 +65,14 @@ TEST(VfpTarget, RecordsInTheFormsTheReadSideDecodes) {
     ASSERT_EQ(t.Put({nullptr, nullptr, nullptr, nullptr, nullptr, nullptr, nullptr, nullptr}), 0);
     ASSERT_EQ(t.Close(), 0);
   }
-  Bytes b = tests::ReadFile(path);
-  ASSERT_EQ(GetLe16(&b[10]), 1 + 4 + 6 + 4 + 8 + 8 + 8 + 8 + 1);
-  EXPECT_EQ(VfpRecord(b, 0), " " + Le32(uint32_t(-7)) + "ann   " + Le32(8) + Le32(2451545) + Le32(43201000) +
-                                 Double(1.5) + Le64(11500) + "20240131T");
-  EXPECT_EQ(VfpRecord(b, 1), " " + Le32(2147483647) + "bob   " + Le32(0) + Le32(2451545) + Le32(59000) +
-                                 Double(-0.25) + Le64(5700) + "        F");
-  EXPECT_EQ(VfpRecord(b, 2), " " + std::string(4, '\0') + "      " + std::string(28, '\0') + "        F");
+  EXPECT_EQ(RecordAt(path, 0), Rec({Le32(uint32_t(-7)), Text("ann   "), Le32(8), Le32(2451545), Le32(43201000),
+                                    Dbl(1.5), Le64(11500), Text("20240131T")}));
+  EXPECT_EQ(RecordAt(path, 1), Rec({Le32(2147483647), Text("bob   "), Le32(0), Le32(2451545), Le32(59000),
+                                    Dbl(-0.25), Le64(5700), Text("        F")}));
+  EXPECT_EQ(RecordAt(path, 2), Rec({Bytes(4, 0), Text("      "), Bytes(28, 0), Text("        F")}));
   // The memo: an FPT text block at block 8, right behind the header.
-  Bytes memo = tests::ReadFile(path.substr(0, path.size() - 3) + "fpt");
-  Bytes want = tests::MemoBytes(tests::FptHeader(9, 64)).At(8, tests::FptBlock("a memo"), 64).Build();
-  EXPECT_EQ(memo, want);
+  Bytes want = tests::MemoBytes(tests::FptHeader(9, 64)).At(8, FptBlock("a memo"), 64).Build();
+  EXPECT_EQ(tests::ReadFile(ScratchPath("vfp_forms.fpt")), want);
 
   tests::Source s(10);
   ASSERT_EQ(s.Open(path), 0);
@@ -117,11 +102,11 @@ TEST(VfpTarget, ValuesAFormCantHoldStopTheRecord) {
       {5, "1e3"},  // currency is taken by its digits only
       {5, "99999999999999999999"},
   };
-  std::string path = tests::ScratchPath("vfp_refused.dbf");
+  std::string path = ScratchPath("vfp_refused.dbf");
   Target t(10);
   AddAll(t);
   ASSERT_EQ(t.Open(path), 0);
-  LogCapture log;
+  tests::LogCapture log;
   for (const Case& c : cases) {
     SCOPED_TRACE(c.value);
     for (int i = 0; i < 8; ++i) t.Set(i, nullptr);
@@ -131,64 +116,53 @@ TEST(VfpTarget, ValuesAFormCantHoldStopTheRecord) {
     EXPECT_EQ(t->Position(), 0);  // nothing written
   }
   ASSERT_EQ(t.Close(), 0);
-  EXPECT_EQ(GetLe32(&tests::ReadFile(path)[4]), 0u);
+  EXPECT_EQ(tests::Written(path).count, 0);
 }
 
 TEST(VfpTarget, MemoBlocksKeptOrGivenUpOnRewrite) {
-  std::string path = tests::ScratchPath("vfp_update.dbf");
-  std::string fpt = path.substr(0, path.size() - 3) + "fpt";
+  std::string path = ScratchPath("vfp_update.dbf"), fpt = ScratchPath("vfp_update.fpt");
+  auto open = [&](Target& t) {
+    t.Add('C', "KEY", 2);
+    t.Add('M', "NOTE");
+    return t.Open(path);
+  };
   {
     Target t(10);
-    t.Add('C', "KEY", 2);
-    t.Add('M', "NOTE");
-    ASSERT_EQ(t.Open(path), 0);
+    ASSERT_EQ(open(t), 0);
     ASSERT_EQ(t.Put({"a", "first"}), 0);
     ASSERT_EQ(t.Put({"b", std::string(100, 'x').c_str()}), 0);  // blocks 9 and 10
-    ASSERT_EQ(t.Close(), 0);
   }
-  Bytes before = tests::ReadFile(fpt);
-  ASSERT_EQ(before.size(), 11u * 64);
   {
     Target t(10, 2);
-    t.Add('C', "KEY", 2);
-    t.Add('M', "NOTE");
-    ASSERT_EQ(t.Open(path), 0);
+    ASSERT_EQ(open(t), 0);
     // The same text again through DeleteRecord: nothing is written.
     ASSERT_EQ(t->DeleteRecord(), 0);
     ASSERT_EQ(t.Put({"a", "first"}), 0);
     // A text that fits the old blocks stays there; a blank one gives them up.
-    ZQRecord& r = t.Layout();
-    t->SetFilePosition(1);
-    ASSERT_EQ(t->GetandDeleteRecord(r), 0);
-    t.Set(1, std::string(110, 'y').c_str());
-    ASSERT_EQ(t.Write(), 0);
-    t->SetFilePosition(0);
-    ASSERT_EQ(t->GetandDeleteRecord(r), 0);
-    t.Set(1, nullptr);
-    ASSERT_EQ(t.Write(), 0);
+    ASSERT_EQ(t.Reread(1), "b");
+    ASSERT_EQ(t.Put({"b", std::string(110, 'y').c_str()}), 0);
+    ASSERT_EQ(t.Reread(0), "a");
+    ASSERT_EQ(t.Put({"a", nullptr}), 0);
     ASSERT_EQ(t.Close(), 0);
   }
-  Bytes b = tests::ReadFile(path);
-  EXPECT_EQ(VfpRecord(b, 0), " a " + Le32(0));
-  EXPECT_EQ(VfpRecord(b, 1), " b " + Le32(9));
+  EXPECT_EQ(RecordAt(path, 0), Rec({Text("a "), Le32(0)}));
+  EXPECT_EQ(RecordAt(path, 1), Rec({Text("b "), Le32(9)}));
+  // Nothing appended, the header and block 8 as they were, block 9 rewritten.
   Bytes memo = tests::ReadFile(fpt);
-  ASSERT_EQ(memo.size(), before.size());  // nothing appended
-  EXPECT_EQ(Bytes(memo.begin(), memo.begin() + 576), Bytes(before.begin(), before.begin() + 576));
-  Bytes block9 = tests::FptBlock(std::string(110, 'y'));
-  EXPECT_EQ(Bytes(memo.begin() + 576, memo.begin() + 576 + long(block9.size())), block9);
+  ASSERT_EQ(memo.size(), 11u * 64);
+  Bytes head = tests::MemoBytes(tests::FptHeader(11, 64)).At(8, FptBlock("first"), 64).Build();
+  EXPECT_EQ(Bytes(memo.begin(), memo.begin() + 576), head);
+  EXPECT_EQ(Slice(fpt, 576, 576 + 8 + 110), FptBlock(std::string(110, 'y')));
 }
 
 TEST(VfpTarget, TablesOfOtherWriters) {
   // The shape another writer gives: no table flags, no displacements, FPT
   // blocks of 128 with the next free block 6, and a _NullFlags column last.
-  std::string path = tests::ScratchPath("vfp_foreign.dbf");
-  Bytes fpt = tests::MemoBytes(tests::FptHeader(5, 128)).At(4, tests::FptBlock("old"), 128).Build();
-  tests::WriteAt(path.substr(0, path.size() - 3) + "fpt", fpt);
-  Bytes rec = {' '};
-  for (char c : Le32(41) + "z " + Le32(4) + Le64(0) + std::string(1, '\0')) rec.push_back(uint8_t(c));
-  tests::WriteAt(path, DbfBuilder(0x30).Field("N", 'I', 4).Field("KEY", 'C', 2).Field("NOTE", 'M', 4)
-                           .Field("PRICE", 'Y', 8, 4).Field("_NullFlags", '0', 1).HeaderExtra(263).RawRecord(rec)
-                           .Build());
+  std::string path = ScratchPath("vfp_foreign.dbf"), fpt = ScratchPath("vfp_foreign.fpt");
+  tests::WriteAt(fpt, tests::MemoBytes(tests::FptHeader(5, 128)).At(4, FptBlock("old"), 128).Build());
+  tests::WriteAt(path, tests::DbfBuilder(0x30).Field("N", 'I', 4).Field("KEY", 'C', 2).Field("NOTE", 'M', 4)
+                           .Field("PRICE", 'Y', 8, 4).Field("_NullFlags", '0', 1).HeaderExtra(263)
+                           .RawRecord(Rec({Le32(41), Text("z "), Le32(4), Le64(0), {0}})).Build());
   {
     Target t(10, 1);
     t.Add('I', "N", 4);
@@ -199,18 +173,17 @@ TEST(VfpTarget, TablesOfOtherWriters) {
     ASSERT_EQ(t.Put({"42", "y", "new", "-2.5"}), 0);
     ASSERT_EQ(t.Close(), 0);
   }
-  Bytes b = tests::ReadFile(path);
-  EXPECT_EQ(GetLe32(&b[4]), 2u);
-  EXPECT_EQ(VfpRecord(b, 1), " " + Le32(42) + "y " + Le32(5) + Le64(uint64_t(-25000)) + std::string(1, '\0'));
-  Bytes memo = tests::ReadFile(path.substr(0, path.size() - 3) + "fpt");
-  EXPECT_EQ(GetBe32(&memo[0]), 6u);
-  EXPECT_EQ(Bytes(memo.begin() + 640, memo.begin() + 651), tests::FptBlock("new"));
+  EXPECT_EQ(tests::Written(path).count, 2);
+  EXPECT_EQ(RecordAt(path, 1), Rec({Le32(42), Text("y "), Le32(5), Le64(uint64_t(-25000)), {0}}));
+  EXPECT_EQ(GetBe32(tests::ReadFile(fpt).data()), 6u);
+  EXPECT_EQ(Slice(fpt, 640, 651), FptBlock("new"));
 
   // A binary field of a width this form doesn't have is no table to write.
-  std::string odd = tests::WriteScratch("vfp_odd.dbf", DbfBuilder(0x30).Field("N", 'I', 8).HeaderExtra(263).Build());
+  std::string odd =
+      tests::WriteScratch("vfp_odd.dbf", tests::DbfBuilder(0x30).Field("N", 'I', 8).HeaderExtra(263).Build());
   Target t(10, 1);
   t.Add('I', "N", 4);
-  LogCapture log;
+  tests::LogCapture log;
   EXPECT_EQ(t.Open(odd), ZQ_LAYOUT_DIFFERS);
   EXPECT_NE(log.Last().find("Field type mismatch on field N"), std::string::npos);
 }

@@ -120,7 +120,6 @@ TEST(ToDbaseEncodeTest, DatesLogicalsAndFieldBounds) {
   EXPECT_EQ(w.Record(0), " 20240229Tabc");
   EXPECT_EQ(w.Record(1).substr(9), "Fabc");  // the year's fifth digit stays out of the next field
   EXPECT_EQ(w.Record(2), "         F   ");
-  EXPECT_EQ(w.Record(3).substr(1, 8).size(), 8u);
   EXPECT_EQ(w.Record(3).substr(9), "Tx  ");
   EXPECT_EQ(w.bytes.back(), 0x1A);
 }
@@ -134,7 +133,7 @@ TEST(ToDbaseEncodeTest, TextStopsAtNulAndOnlyTextTakesTheCodePage) {
   ASSERT_EQ(t.Open(path), 0);
   // UTF-8 "Müller": one byte in code page 850; memo text goes as it is.
   ASSERT_EQ(t.Put({"M\xC3\xBCller", "gr\xC3\xBC\xC3\x9F", "12"}), 0);
-  t.SetBytes(0, std::string("ab\0cd", 5));  // the copy stops at the NUL byte
+  t[0]->AssignText("ab\0cd", 5);  // the copy stops at the NUL byte
   t.Set(1, nullptr);
   t.Set(2, nullptr);
   ASSERT_EQ(t.Write(), 0);
@@ -149,13 +148,6 @@ TEST(ToDbaseEncodeTest, TextStopsAtNulAndOnlyTextTakesTheCodePage) {
   Bytes memo = tests::ReadFile(ScratchPath("cp.dbt"));
   ASSERT_GE(memo.size(), 512u + 7);
   EXPECT_EQ(std::string(memo.begin() + 512, memo.begin() + 512 + 7), "gr\xC3\xBC\xC3\x9F\x1A");
-
-  // The table reads back through the source spoke, text converted back.
-  tests::Source s(1, 0, 850);
-  ASSERT_EQ(s.Open(path), 0);
-  ASSERT_EQ(s->GetRecord(0), 0);
-  EXPECT_EQ(s.Text(0), "M\xC3\xBCller");
-  EXPECT_EQ(s.Text(1), "gr\xC3\xBC\xC3\x9F");
 }
 
 TEST(ToDbaseEncodeTest, TypeRulesAndDescriptors) {
@@ -209,8 +201,6 @@ TEST(ToDbaseEncodeTest, FieldCapsOfNewTables) {
     tests::Source s(c.dialect);
     ASSERT_EQ(s.Open(path), 0);
     EXPECT_EQ(s.FieldCount(), c.cap);
-    ASSERT_EQ(s->GetRecord(0), 0);
-    EXPECT_EQ(s.Text(c.cap - 1), std::to_string((c.cap - 1) % 10));
   }
 }
 

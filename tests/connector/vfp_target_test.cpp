@@ -74,17 +74,6 @@ TEST(VfpTarget, RecordsInTheFormsTheReadSideDecodes) {
   Bytes want = tests::MemoBytes(tests::FptHeader(9, 64)).At(8, FptBlock("a memo"), 64).Build();
   EXPECT_EQ(tests::ReadFile(ScratchPath("vfp_forms.fpt")), want);
 
-  tests::Source s(10);
-  ASSERT_EQ(s.Open(path), 0);
-  ASSERT_EQ(s->GetRecord(0), 0);
-  EXPECT_EQ(s.Text(0), "-7");
-  EXPECT_EQ(s.Text(2), "a memo");
-  EXPECT_EQ(s.Text(3), "2000-01-01T12:00:01");
-  EXPECT_EQ(s.Field(4)->DoubleVal(), 1.5);
-  EXPECT_EQ(s.Field(5)->DoubleVal(), 1.15);
-  ASSERT_EQ(s->GetRecord(2), 0);
-  EXPECT_TRUE(s.Field(2)->IsBlank());
-  EXPECT_TRUE(s.Field(3)->IsBlank());
 }
 
 TEST(VfpTarget, ValuesAFormCantHoldStopTheRecord) {

@@ -10,9 +10,5 @@ class DbaseTestPeer {
   // The table object of a source spoke: its live option block.
   static ZQDbase& Of(ZQFromDbase* spoke) { return *static_cast<ZQDbase*>(spoke->GetOptions()); }
   static BATCHERR SetOptions(ZQDbase& db, const ZQSpokeOptions* opts) { return db.SetOptions(opts); }
-  static int32_t DeletedSkipped(const ZQDbase& db) { return db.DeletedSkipped; }
-  static int32_t HighRecord(const ZQDbase& db) { return db.HighRecord; }
-  static int32_t CurrentPhysical(const ZQDbase& db) { return db.CurrentPhysical; }
   static const ZQHashTable& RecordMap(const ZQDbase& db) { return db.RecordMap; }
-  static const char* BasePath(const ZQDbase& db) { return db.BasePath; }
 };

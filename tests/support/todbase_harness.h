@@ -91,7 +91,6 @@ class Target {
     BATCHERR rc = spoke_->GetandDeleteRecord(Layout());
     return rc == 0 ? std::string(Layout()[field]->StringRef().c_str()) : "#" + std::to_string(rc);
   }
-  void SetBytes(int i, const std::string& bytes) { Layout()[i]->AssignText(bytes.data(), int32_t(bytes.size())); }
 
  private:
   ZQToDbase* spoke_;
@@ -108,15 +107,9 @@ struct Written {
   explicit Written(const std::string& path) : bytes(ReadFile(path)) {
     if (bytes.size() < 12) return;
     narrow = bytes[0] == 0x02 || bytes[0] == 0xFE;
-    if (narrow) {
-      count = GetLe16(&bytes[1]);
-      reclen = GetLe16(&bytes[6]);
-      hdrlen = 521;
-    } else {
-      count = int32_t(GetLe32(&bytes[4]));
-      hdrlen = GetLe16(&bytes[8]);
-      reclen = GetLe16(&bytes[10]);
-    }
+    count = narrow ? GetLe16(&bytes[1]) : int32_t(GetLe32(&bytes[4]));
+    hdrlen = narrow ? 521 : GetLe16(&bytes[8]);
+    reclen = GetLe16(&bytes[narrow ? 6 : 10]);
   }
   uint8_t version() const { return bytes.empty() ? 0 : bytes[0]; }
   // Record n with its flag byte; "" when it lies outside the file.
@@ -125,12 +118,11 @@ struct Written {
     if (reclen <= 0 || at + size_t(reclen) > bytes.size()) return "";
     return std::string(bytes.begin() + long(at), bytes.begin() + long(at + size_t(reclen)));
   }
-  // Descriptors of the wide header: (name, type letter, length, decimals).
+  // Descriptors of the wide header: type letter, length, decimals.
   int FieldCount() const { return narrow ? 0 : (hdrlen - 33) / 32; }
   char Type(int i) const { return char(bytes[size_t(32 + 32 * i + 11)]); }
   int Length(int i) const { return bytes[size_t(32 + 32 * i + 16)]; }
   int Decimals(int i) const { return bytes[size_t(32 + 32 * i + 17)]; }
-  std::string Name(int i) const { return std::string(reinterpret_cast<const char*>(&bytes[size_t(32 + 32 * i)])); }
 };
 
 }  // namespace tests

@@ -32,16 +32,17 @@ struct Phys : Target {
     Add('C', "PHYS", 6);
     opened = Open(path);
   }
-  // Reads on from the position until a read fails; the positions read, and
-  // in `rc` the result that stopped it.
-  std::vector<int64_t> Scan(BATCHERR* rc = nullptr) {
+  // Reads on from the position until a read fails: "<position>:<value>" of
+  // each record read, and in `rc` the result that stopped it.
+  Lines Scan(BATCHERR* rc = nullptr) {
     ZQRecord r(Layout());
-    std::vector<int64_t> positions;
+    Lines read;
     int64_t pos = -1;
     BATCHERR last;
-    while ((last = (*this)->GetRecord(r, &pos)) == 0) positions.push_back(pos);
+    while ((last = (*this)->GetRecord(r, &pos)) == 0)
+      read.push_back(std::to_string(pos) + ":" + r[0]->StringRef().c_str());
     if (rc != nullptr) *rc = last;
-    return positions;
+    return read;
   }
   // The records written as "<flag><value>", trailing blanks cut (the table closed first).
   Lines Rows() {
@@ -65,11 +66,7 @@ TEST(ToDbaseUpdateTest, PositionsCountLiveRecords) {
   ASSERT_EQ(t.Put({"L1"}), 0);
   EXPECT_EQ(t->Position(), 2);
   // A read goes on from the write: logical 2 is physical 4.
-  ZQRecord r(t.Layout());
-  int64_t pos = -1;
-  ASSERT_EQ(t->GetRecord(r, &pos), 0);
-  EXPECT_EQ(pos, 2);
-  EXPECT_EQ(std::string(r[0]->StringRef().c_str()), "p4");
+  EXPECT_EQ(t.Scan(), (Lines{"2:p4", "3:p5"}));
   t->SetFilePosition(3);
   ASSERT_EQ(t.Put({"L3"}), 0);
   // In a row from the start: every write on the next live record.
@@ -84,7 +81,7 @@ TEST(ToDbaseUpdateTest, PositionsCountLiveRecords) {
   Phys u("upd_scan.dbf", 2, 7, {0, 3, 4});
   ASSERT_EQ(u.opened, 0);
   BATCHERR rc;
-  EXPECT_EQ(u.Scan(&rc), (std::vector<int64_t>{0, 1, 2, 3}));
+  EXPECT_EQ(u.Scan(&rc), (Lines{"0:p1", "1:p2", "2:p5", "3:p6"}));
   EXPECT_EQ(rc, ZQ_END);
   EXPECT_EQ(u->Position(), 4);
   for (int64_t p : {int64_t{2}, int64_t{0}, int64_t{3}}) {
@@ -138,7 +135,7 @@ TEST(ToDbaseUpdateTest, AppendingBehindTheLastRecord) {
   // Reading: the last record leaves the position at the count; then 1.
   t->SetFilePosition(4);
   BATCHERR rc;
-  EXPECT_EQ(t.Scan(&rc), (std::vector<int64_t>{4}));
+  EXPECT_EQ(t.Scan(&rc), (Lines{"4:a4"}));
   EXPECT_EQ(rc, ZQ_END);
   EXPECT_EQ(t->Position(), 5);
   EXPECT_EQ(t.Rows(), (Lines{" p0", " p1", " p2", " a3", " a4"}));

@@ -118,11 +118,10 @@ struct Written {
     if (reclen <= 0 || at + size_t(reclen) > bytes.size()) return "";
     return std::string(bytes.begin() + long(at), bytes.begin() + long(at + size_t(reclen)));
   }
-  // Descriptors of the wide header: type letter, length, decimals.
+  // Descriptors of the wide header: type letter and length.
   int FieldCount() const { return narrow ? 0 : (hdrlen - 33) / 32; }
   char Type(int i) const { return char(bytes[size_t(32 + 32 * i + 11)]); }
   int Length(int i) const { return bytes[size_t(32 + 32 * i + 16)]; }
-  int Decimals(int i) const { return bytes[size_t(32 + 32 * i + 17)]; }
 };
 
 }  // namespace tests

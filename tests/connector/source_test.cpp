@@ -128,7 +128,8 @@ TEST(SourceTest, RecordCountBeyondTheFileEndsCleanly) {
   // file holds 2 and an end mark; and a count of 2^31 - 1 without an end
   // mark, which ends as soon as the file does, and a request for a record
   // far behind it too (a read per promised record would never end).
-  Bytes promised = DbfBuilder(0x03).Field("PHYS", 'C', 6).Record({"p0"}).Record({"p1"}).CountInHeader(5).Build();
+  Bytes promised =
+      DbfBuilder(0x03).Field("PHYS", 'C', 6).Record({"p0"}).Record({"p1"}).CountInHeader(5).Build();
   Bytes huge = promised;
   PutLe32(&huge[kWideRecCount], 0x7FFFFFFF);
   huge.pop_back();
@@ -260,8 +261,8 @@ TEST(SourceTest, MissingMemoFileByPolicy) {
   for (int policy : {0, 1, 2}) {
     SCOPED_TRACE(policy);
     Source s(4, policy);
-    ASSERT_EQ(s.Open(tests::WriteScratch("src_small.dbf", DbfBuilder(0x03).Field("A", 'C', 1).Record({"a"}).Build())),
-              0);
+    Bytes small = DbfBuilder(0x03).Field("A", 'C', 1).Record({"a"}).Build();
+    ASSERT_EQ(s.Open(tests::WriteScratch("src_small.dbf", small)), 0);
     ASSERT_EQ(s.At(0), "a");
     tests::LogCapture log;
     if (policy == 0) {

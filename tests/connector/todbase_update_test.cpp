@@ -200,7 +200,8 @@ TEST(ToDbaseUpdateTest, MemoBlocksOnRewrite) {
 TEST(ToDbaseUpdateTest, BlankMemoGivesDbase4BlocksUp) {
   // Three memos of 600 bytes take two blocks of 512 each: blocks 1, 3, 5.
   // Record 1 is rewritten with a blank memo, then a record is added.
-  const std::string text(600, 'q'), path = ScratchPath("memo_free.dbf"), memo_path = ScratchPath("memo_free.dbt");
+  const std::string text(600, 'q');
+  const std::string path = ScratchPath("memo_free.dbf"), memo_path = ScratchPath("memo_free.dbt");
   for (bool chain : {false, true}) {
     SCOPED_TRACE(chain ? "free chain" : "plain");
     {
@@ -310,7 +311,8 @@ TEST(ToDbaseUpdateTest, FileThatCannotGrow) {
     int width, length;  // the field, and the length of each value written
     const char* message;
   };
-  for (Case c : {Case{'C', 200, 21, "Error -1 returned from dbput"}, Case{'M', 0, 3000, "Error adding memo"}}) {
+  for (Case c : {Case{'C', 200, 21, "Error -1 returned from dbput"},
+                 Case{'M', 0, 3000, "Error adding memo"}}) {
     SCOPED_TRACE(c.message);
     int status = WithFileSizeLimit(20000, [&] {
       Target t(2, 0);

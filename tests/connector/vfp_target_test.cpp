@@ -140,7 +140,7 @@ TEST(VfpTarget, MemoBlocksKeptOrGivenUpOnRewrite) {
 TEST(VfpTarget, TablesOfOtherWriters) {
   // A binary field of a width this form doesn't have is no table to write.
   // (Appending to and updating a table that python3-dbf wrote, with its own
-  // FPT blocks, is tests/interop/test_vfp_target.py.)
+  // FPT blocks, is tests/interop/test_convert.py.)
   std::string odd =
       tests::WriteScratch("vfp_odd.dbf", tests::DbfBuilder(0x30).Field("N", 'I', 8).HeaderExtra(263).Build());
   Target t(10, 1);

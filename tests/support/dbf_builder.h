@@ -55,6 +55,11 @@ class DbfBuilder {
   DbfBuilder& CountInHeader(int32_t n) { count_override_ = n; return *this; }
   DbfBuilder& RecordLength(int n) { reclen_override_ = n; return *this; }
   DbfBuilder& NoEndMark() { end_mark_ = false; return *this; }
+  // The wide header's flags byte at 28 (production index, memo fields).
+  DbfBuilder& Flags(uint8_t flags) { flags_ = flags; return *this; }
+  // Visual FoxPro: each wide descriptor holds its field's displacement in the
+  // record at 12.
+  DbfBuilder& Displacements() { displacements_ = true; return *this; }
 
   int RecLen() const {
     if (reclen_override_ >= 0) return reclen_override_;
@@ -89,14 +94,18 @@ class DbfBuilder {
       PutLe32(&out[4], uint32_t(count));
       PutLe16(&out[8], uint16_t(HeaderLength()));
       PutLe16(&out[10], uint16_t(RecLen()));
+      out[28] = flags_;
     }
     const size_t length_at = narrow_ ? 12 : 16;
+    uint32_t displacement = 1;
     for (const auto& f : fields_) {
       Bytes d(narrow_ ? 16 : 32, 0);
       for (size_t i = 0; i < f.name.size() && i < 11; ++i) d[i] = uint8_t(f.name[i]);
       d[11] = uint8_t(f.type);
       d[length_at] = uint8_t(f.length);
       d[narrow_ ? 15 : 17] = uint8_t(f.decimals);
+      if (displacements_) PutLe32(&d[12], displacement);
+      displacement += uint32_t(f.length);
       out.insert(out.end(), d.begin(), d.end());
     }
     out.push_back(0x0D);
@@ -123,6 +132,8 @@ class DbfBuilder {
   int32_t count_override_ = -1;
   int reclen_override_ = -1;
   bool end_mark_ = true;
+  uint8_t flags_ = 0;
+  bool displacements_ = false;
   std::vector<FieldSpec> fields_;
   std::vector<Bytes> records_;
 };

@@ -46,42 +46,19 @@ std::string Sibling(const std::string& path, const std::string& ext) {
   return path.substr(0, path.rfind('.') + 1) + ext;
 }
 
-// Checks the date bytes against today and blanks them for a byte comparison.
-void TakeDate(Bytes& b, int day_off, int month_off, int year_off) {
-  ASSERT_GE(b.size(), 32u);
+// Compares the table dbcreat made at `path` with the builder's bytes (with
+// no end mark), the date aside: the file's must be today's.
+void ExpectTable(const std::string& path, tests::DbfBuilder want, bool narrow) {
+  Bytes b = tests::ReadFile(path), w = want.NoEndMark().Build();
+  ASSERT_GE(b.size(), 8u);
   char day, month, year;
   dbdate(&day, &month, &year);
-  EXPECT_EQ(b[size_t(day_off)], uint8_t(day));
-  EXPECT_EQ(b[size_t(month_off)], uint8_t(month));
-  EXPECT_EQ(b[size_t(year_off)], uint8_t(year));
-  b[size_t(day_off)] = b[size_t(month_off)] = b[size_t(year_off)] = 0;
-}
-
-// A descriptor of the wide header; Visual FoxPro's carry the field's
-// displacement in the record.
-Bytes WideDescriptor(const char* name, char type, uint8_t length, uint8_t decimals, uint32_t displacement = 0) {
-  Bytes d(32, 0);
-  for (size_t i = 0; name[i] != '\0'; ++i) d[i] = uint8_t(name[i]);
-  d[11] = uint8_t(type);
-  PutLe32(&d[12], displacement);
-  d[16] = length;
-  d[17] = decimals;
-  return d;
-}
-
-// A wide header with its date blanked: the flags at 28, the descriptors, the
-// terminator and `room` zero bytes behind it (1, or Visual FoxPro's 263).
-Bytes WideHeader(uint8_t version, uint16_t reclen, uint8_t flags, std::initializer_list<Bytes> descriptors,
-                 size_t room = 1) {
-  Bytes h(32, 0);
-  h[0] = version;
-  PutLe16(&h[8], uint16_t(32 + 32 * descriptors.size() + 1 + room));
-  PutLe16(&h[10], reclen);
-  h[28] = flags;
-  for (const Bytes& d : descriptors) h.insert(h.end(), d.begin(), d.end());
-  h.push_back(0x0D);
-  h.resize(h.size() + room, 0);
-  return h;
+  size_t at = narrow ? 3 : 1;  // narrow: month, year, day; wide: year, month, day
+  Bytes today = narrow ? Bytes{uint8_t(month), uint8_t(year), uint8_t(day)}
+                       : Bytes{uint8_t(year), uint8_t(month), uint8_t(day)};
+  EXPECT_EQ(Bytes(b.begin() + long(at), b.begin() + long(at) + 3), today);
+  for (size_t i = at; i < at + 3; ++i) b[i] = w[i] = 0;
+  EXPECT_EQ(b, w);
 }
 
 TEST(Create, MemoHeaderOfEachKind) {
@@ -138,13 +115,9 @@ TEST(Create, NarrowHeaderTakesTheRoomOf32Fields) {
   for (const Case& c : cases) {
     SCOPED_TRACE(c.fields.size());
     std::string path = Create("n" + std::to_string(c.fields.size()) + ".dbf", c.fields, c.dialect);
-    Bytes b = tests::ReadFile(path);
-    TakeDate(b, 5, 3, 4);
     tests::DbfBuilder want(c.version, true);
     for (const ZQDBFIELD& d : c.fields) want.Field(d.name, char(d.type), d.length, d.decimals);
-    Bytes w = want.NoEndMark().Build();
-    w[3] = w[4] = w[5] = 0;  // the builder's date
-    EXPECT_EQ(b, w);
+    ExpectTable(path, want, true);
     EXPECT_EQ(ZQFileProxy::fileExists(Sibling(path, "dbt").c_str()), !c.memo.empty());
     EXPECT_EQ(tests::ReadFile(Sibling(path, "dbt")), c.memo);
     if (c.hdrlen == 0) continue;
@@ -158,12 +131,10 @@ TEST(Create, NarrowHeaderTakesTheRoomOf32Fields) {
 }
 
 TEST(Create, WideEdgeCases) {
-  Bytes b = tests::ReadFile(Create("w0.dbf", {}, DIALECT_DBASE3));
-  TakeDate(b, 3, 2, 1);
-  EXPECT_EQ(b, WideHeader(0x03, 1, 0, {}));
+  ExpectTable(Create("w0.dbf", {}, DIALECT_DBASE3), tests::DbfBuilder(0x03).HeaderExtra(1), false);
 
   // A name of all 11 bytes has no NUL in the file.
-  b = tests::ReadFile(Create("w11.dbf", {{"ABCDEFGHIJK", 'C', 5, 0}}, DIALECT_DBASE3P));
+  Bytes b = tests::ReadFile(Create("w11.dbf", {{"ABCDEFGHIJK", 'C', 5, 0}}, DIALECT_DBASE3P));
   EXPECT_EQ(Bytes(b.begin() + 32, b.begin() + 44), tests::Text("ABCDEFGHIJKC"));
 
   // A record length past 16 bits is refused before any file is made.
@@ -194,48 +165,40 @@ TEST(Create, WideHeaderFlagsWidthsAndMemoFile) {
   // dialect) gets an empty FPT file all the same, since the table's own open
   // looks for one whenever a "B" field is there, but its flags say it has no
   // memo fields.
+  using tests::DbfBuilder;
   struct Case {
     const char* file;
     Fields fields;
     int dialect;
     bool production;
-    Bytes header;
+    DbfBuilder header;
     const char* ext;  // of the memo file, if any
     Bytes memo;
   } cases[] = {
       {"wide4.dbf", {{"NAME", 'C', 10, 0}, {"NOTES", 'M', 4, 0}, {"AMOUNT", 'N', 8, 2}}, DIALECT_DBASE4 | kMemo,
-       true,
-       WideHeader(0x8B, 29, 1,
-                  {WideDescriptor("NAME", 'C', 10, 0), WideDescriptor("NOTES", 'M', 10, 0),
-                   WideDescriptor("AMOUNT", 'N', 8, 2)}),
+       true, DbfBuilder(0x8B).Field("NAME", 'C', 10).Field("NOTES", 'M', 10).Field("AMOUNT", 'N', 8, 2)
+           .HeaderExtra(1).Flags(1),
        "dbt", tests::Db4Header(1, 0x0101, 512, "WIDE4")},
       {"vfp_plain.dbf",
        {{"ID", 'I', 11, 0}, {"NAME", 'C', 10, 0}, {"WHEN", 'T', 19, 0}, {"PRICE", 'Y', 20, 4},
         {"AMOUNT", 'N', 8, 2}},
        DIALECT_VFOXPRO, false,
-       WideHeader(0x30, 39, 0x00,  // record: 1 + 4 + 10 + 8 + 8 + 8
-                  {WideDescriptor("ID", 'I', 4, 0, 1), WideDescriptor("NAME", 'C', 10, 0, 5),
-                   WideDescriptor("WHEN", 'T', 8, 0, 15), WideDescriptor("PRICE", 'Y', 8, 4, 23),
-                   WideDescriptor("AMOUNT", 'N', 8, 2, 31)},
-                  263),
+       DbfBuilder(0x30).Field("ID", 'I', 4).Field("NAME", 'C', 10).Field("WHEN", 'T', 8).Field("PRICE", 'Y', 8, 4)
+           .Field("AMOUNT", 'N', 8, 2).HeaderExtra(263).Displacements(),
        "", {}},
       {"vfp_memo.dbf",
        {{"NAME", 'C', 10, 0}, {"NOTES", 'M', 10, 0}, {"PIC", 'G', 10, 0}, {"RATE", 'B', 10, 0}},
        DIALECT_VFOXPRO | kMemo, true,
-       WideHeader(0x30, 27, 0x03,
-                  {WideDescriptor("NAME", 'C', 10, 0, 1), WideDescriptor("NOTES", 'M', 4, 0, 11),
-                   WideDescriptor("PIC", 'G', 4, 0, 15), WideDescriptor("RATE", 'B', 8, 0, 19)},
-                  263),
+       DbfBuilder(0x30).Field("NAME", 'C', 10).Field("NOTES", 'M', 4).Field("PIC", 'G', 4).Field("RATE", 'B', 8)
+           .HeaderExtra(263).Displacements().Flags(0x03),
        "fpt", tests::FptHeader(8, 64)},
       {"vfp_double.dbf", {{"RATE", 'B', 8, 0}}, DIALECT_VFOXPRO | kMemo, false,
-       WideHeader(0x30, 9, 0x00, {WideDescriptor("RATE", 'B', 8, 0, 1)}, 263), "fpt", tests::FptHeader(8, 64)},
+       DbfBuilder(0x30).Field("RATE", 'B', 8).HeaderExtra(263).Displacements(), "fpt", tests::FptHeader(8, 64)},
   };
   for (const Case& c : cases) {
     SCOPED_TRACE(c.file);
     std::string path = Create(c.file, c.fields, c.dialect, c.production);
-    Bytes b = tests::ReadFile(path);
-    TakeDate(b, 3, 2, 1);
-    EXPECT_EQ(b, c.header);
+    ExpectTable(path, c.header, false);
     for (const char* ext : {"dbt", "fpt"}) {
       bool made = std::string(ext) == c.ext;
       EXPECT_EQ(ZQFileProxy::fileExists(Sibling(path, ext).c_str()), made) << ext;
@@ -244,9 +207,9 @@ TEST(Create, WideHeaderFlagsWidthsAndMemoFile) {
     // Its own open takes it: the header length is read, not recomputed.
     tests::OpenedTable t(path, c.dialect & ~kMemo);
     ASSERT_NE(t.db, nullptr);
-    EXPECT_EQ(t.db->hdrlen, int(c.header.size()));
+    EXPECT_EQ(t.db->hdrlen, c.header.HeaderLength());
     EXPECT_EQ(t.db->fieldcount, int(c.fields.size()));
-    EXPECT_EQ(t.fields[0]->length, c.header[32 + 16]);
+    EXPECT_EQ(t.db->reclen, c.header.RecLen());
     EXPECT_EQ(t.db->memofailed, 0);
   }
 }

@@ -1,14 +1,23 @@
 // ZQFileProxy: buffered reads, writes and seeks across buffer boundaries,
 // read-after-write, the end and error states, and sticky write failure.
+// The page cache behind the platform layer's descriptors: what one
+// descriptor writes the others read at once, an open that truncates forgets
+// the cached pages, pages evicted or left at close reach the file, and the
+// file ends where the last write ended.
 #include <gtest/gtest.h>
 
 #include <string>
 #include <vector>
 
+#include "host/filecache.h"
+#include "host/platform.h"
 #include "host/zqfile.h"
 #include "tests/support/read_harness.h"
 
 namespace {
+
+using tests::ReadFile;
+using tests::ScratchPath;
 
 constexpr int32_t kBuf = ZQFileProxy::kBufferSize;
 
@@ -22,48 +31,64 @@ tests::Bytes PatternBytes(int64_t n) {
   return b;
 }
 
-TEST(ZQFileProxyTest, ReadsAndSeeksAcrossBufferBoundaries) {
-  const int64_t size = 3 * int64_t{kBuf} + 123;
-  std::string path = tests::WriteScratch("file_read.bin", PatternBytes(size));
+TEST(ZQFileProxyTest, ReadsWritesAndSeeksAcrossBufferBoundaries) {
+  const int64_t size = 2 * int64_t{kBuf} + 77;
+  std::string path = tests::WriteScratch("file_rw.bin", PatternBytes(size));
+  tests::Bytes expect = PatternBytes(size);
   ZQFileProxy f;
-  ASSERT_EQ(f.openfile(path.c_str(), "rb", 0), 0);
+  ASSERT_EQ(f.openfile(path.c_str(), "r+b", 0), 0);
   EXPECT_EQ(f.size(), size);
 
-  // Byte by byte over the first boundary.
+  // Byte by byte over the first boundary, then back by a relative seek.
   ASSERT_EQ(f.seek(kBuf - 3, 0), kBuf - 3);
   for (int64_t i = kBuf - 3; i < kBuf + 3; ++i) ASSERT_EQ(f.getch(), Pattern(i)) << i;
-
-  // A record-sized read that straddles the second boundary.
-  std::vector<char> got(1000);
-  ASSERT_EQ(f.seek(2 * int64_t{kBuf} - 500, 0), 2 * int64_t{kBuf} - 500);
-  ASSERT_EQ(f.read(got.data(), 1000), 1000);
-  for (int i = 0; i < 1000; ++i) ASSERT_EQ(uint8_t(got[size_t(i)]), Pattern(2 * kBuf - 500 + i)) << i;
-
-  // Backwards, relative and from the end.
-  ASSERT_EQ(f.seek(-1500, 1), 2 * int64_t{kBuf} - 1000);
-  EXPECT_EQ(f.getch(), Pattern(2 * kBuf - 1000));
-  ASSERT_EQ(f.seek(-2, 2), size - 2);
-  EXPECT_EQ(f.getch(), Pattern(size - 2));
-  EXPECT_EQ(f.getch(), Pattern(size - 1));
-
-  // One read larger than the buffer, from an odd place.
-  std::vector<char> big(size_t(kBuf) + 4096);
-  ASSERT_EQ(f.seek(17, 0), 17);
-  ASSERT_EQ(f.read(big.data(), int32_t(big.size())), int32_t(big.size()));
-  for (size_t i = 0; i < big.size(); ++i) ASSERT_EQ(uint8_t(big[i]), Pattern(17 + int64_t(i))) << i;
+  ASSERT_EQ(f.seek(-1000, 1), kBuf - 997);
+  EXPECT_EQ(f.getch(), Pattern(kBuf - 997));
 
   // A short read at the end sets the end state but no error.
-  ASSERT_EQ(f.seek(size - 10, 0), size - 10);
-  EXPECT_EQ(f.read(got.data(), 100), 10);
+  char got[100];
+  ASSERT_EQ(f.seek(-10, 2), size - 10);
+  EXPECT_EQ(f.read(got, 100), 10);
   EXPECT_TRUE(f.atEof());
   EXPECT_FALSE(f.hasError());
-
   // A negative target is refused with the error state; the position stays.
   EXPECT_EQ(f.seek(-1, 0), -1);
   EXPECT_TRUE(f.hasError());
   f.clearErrors();
   EXPECT_EQ(f.tell(), size);
+
+  // Read into the buffer, then overwrite inside it and read straight back.
+  ASSERT_EQ(f.seek(0, 0), 0);
+  EXPECT_EQ(f.getch(), Pattern(0));
+  ASSERT_EQ(f.seek(100, 0), 100);
+  ASSERT_EQ(f.write("ABCDE", 5), 5);
+  for (int i = 0; i < 5; ++i) expect[size_t(100 + i)] = uint8_t("ABCDE"[i]);
+  ASSERT_EQ(f.seek(98, 0), 98);
+  ASSERT_EQ(f.read(got, 9), 9);
+  EXPECT_EQ(tests::Bytes(got, got + 9), tests::Bytes(&expect[98], &expect[107]));
+
+  // A write that straddles the first boundary, in odd-sized pieces.
+  std::string piece(3001, 'x');
+  for (size_t i = 0; i < piece.size(); ++i) piece[i] = char('a' + i % 26);
+  ASSERT_EQ(f.seek(kBuf - 1500, 0), kBuf - 1500);
+  ASSERT_EQ(f.write(piece.data(), 1000), 1000);
+  ASSERT_EQ(f.write(piece.data() + 1000, 2001), 2001);
+  for (size_t i = 0; i < piece.size(); ++i) expect[size_t(kBuf - 1500) + i] = uint8_t(piece[i]);
+  // putch behind the end of the file grows it.
+  ASSERT_EQ(f.seek(0, 2), size);
+  EXPECT_EQ(f.putch(0x1A), 0x1A);
+  expect.push_back(0x1A);
+  EXPECT_EQ(f.size(), size + 1);
+
+  // Everything reads back through the object before any flush (most of it
+  // in one read larger than the buffer)...
+  ASSERT_EQ(f.seek(0, 0), 0);
+  tests::Bytes all(expect.size());
+  ASSERT_EQ(f.read(reinterpret_cast<char*>(all.data()), int32_t(all.size())), int32_t(all.size()));
+  EXPECT_EQ(all, expect);
+  // ...and from the disk after close.
   EXPECT_EQ(f.close(true), 0);
+  EXPECT_EQ(tests::ReadFile(path), expect);
 }
 
 TEST(ZQFileProxyTest, GetchAtEndSetsEndAndErrorUntilCleared) {
@@ -83,52 +108,6 @@ TEST(ZQFileProxyTest, GetchAtEndSetsEndAndErrorUntilCleared) {
   EXPECT_FALSE(f.atEof());
   ASSERT_EQ(f.seek(0, 0), 0);
   EXPECT_EQ(f.getch(), 0x41);
-
-  ZQFileProxy empty;
-  std::string none = tests::WriteScratch("file_empty.bin", {});
-  ASSERT_EQ(empty.openfile(none.c_str(), "rb", 0), 0);
-  EXPECT_EQ(empty.getch(), -1);
-  EXPECT_TRUE(empty.hasError());
-}
-
-TEST(ZQFileProxyTest, WritesReadBackBeforeAndAfterFlush) {
-  const int64_t size = 2 * int64_t{kBuf} + 77;
-  std::string path = tests::WriteScratch("file_write.bin", PatternBytes(size));
-  tests::Bytes expect = PatternBytes(size);
-  ZQFileProxy f;
-  ASSERT_EQ(f.openfile(path.c_str(), "r+b", 0), 0);
-
-  // Read into the buffer, then overwrite inside it and read straight back.
-  EXPECT_EQ(f.getch(), Pattern(0));
-  ASSERT_EQ(f.seek(100, 0), 100);
-  ASSERT_EQ(f.write("ABCDE", 5), 5);
-  for (int i = 0; i < 5; ++i) expect[size_t(100 + i)] = uint8_t("ABCDE"[i]);
-  ASSERT_EQ(f.seek(98, 0), 98);
-  char got[9];
-  ASSERT_EQ(f.read(got, 9), 9);
-  for (int i = 0; i < 9; ++i) EXPECT_EQ(uint8_t(got[i]), expect[size_t(98 + i)]) << i;
-
-  // A write that straddles the first boundary, in odd-sized pieces.
-  std::string piece(3001, 'x');
-  for (size_t i = 0; i < piece.size(); ++i) piece[i] = char('a' + i % 26);
-  ASSERT_EQ(f.seek(kBuf - 1500, 0), kBuf - 1500);
-  ASSERT_EQ(f.write(piece.data(), 1000), 1000);
-  ASSERT_EQ(f.write(piece.data() + 1000, 2001), 2001);
-  for (size_t i = 0; i < piece.size(); ++i) expect[size_t(kBuf - 1500) + i] = uint8_t(piece[i]);
-  // putch behind the end of the file grows it.
-  ASSERT_EQ(f.seek(0, 2), size);
-  EXPECT_EQ(f.putch(0x1A), 0x1A);
-  expect.push_back(0x1A);
-  EXPECT_EQ(f.size(), size + 1);
-
-  // Everything reads back through the object before any flush...
-  ASSERT_EQ(f.seek(0, 0), 0);
-  std::vector<char> all(expect.size());
-  ASSERT_EQ(f.read(all.data(), int32_t(all.size())), int32_t(all.size()));
-  for (size_t i = 0; i < all.size(); ++i) ASSERT_EQ(uint8_t(all[i]), expect[i]) << i;
-  // ...and from the disk after close.
-  EXPECT_EQ(f.close(true), 0);
-  EXPECT_EQ(tests::ReadFile(path), expect);
 }
 
 TEST(ZQFileProxyTest, WriteFailureIsStickyUntilCleared) {
@@ -161,56 +140,67 @@ TEST(ZQFileProxyTest, WriteFailureIsStickyUntilCleared) {
   EXPECT_TRUE(bad.hasError());
 }
 
-TEST(ZQFileProxyTest, CreateModeTruncates) {
-  std::string path = tests::WriteScratch("file_wb.bin", {9, 9, 9, 9});
-  ZQFileProxy f;
-  ASSERT_EQ(f.openfile(path.c_str(), "wb", 0), 0);
-  EXPECT_EQ(f.size(), 0);
-  ASSERT_EQ(f.write("\x01\x02", 2), 2);
-  EXPECT_EQ(f.close(true), 0);
-  EXPECT_EQ(tests::ReadFile(path), (tests::Bytes{1, 2}));
-  EXPECT_TRUE(ZQFileProxy::fileExists(path.c_str()));
-  EXPECT_FALSE(ZQFileProxy::fileExists(tests::ScratchPath("file_none.bin").c_str()));
+TEST(FileCache, DescriptorsOfOneFileShareItsPages) {
+  std::string path = ScratchPath("cache-share.bin");
+  int a = _open(path.c_str(), kRtReadWrite | kRtCreate | kRtTruncate | kRtBinary);
+  int b = _open(path.c_str(), kRtReadWrite | kRtBinary);
+  ASSERT_GE(a, 0);
+  ASSERT_GE(b, 0);
+  ASSERT_EQ(_lseek(a, 5000, 0), 5000);
+  ASSERT_EQ(_write(a, "abc", 3), 3);
+  EXPECT_EQ(_lseek(b, 0, 2), 5003);  // the end as written, not yet on disk
+  char got[4] = {};
+  ASSERT_EQ(_lseek(b, 5000, 0), 5000);
+  ASSERT_EQ(_read(b, got, 8), 3);  // a read stops at the end
+  EXPECT_STREQ(got, "abc");
+  EXPECT_EQ(ReadFile(path).size(), 0u);  // nothing written back while both are open
+  _close(a);
+  EXPECT_EQ(ReadFile(path).size(), 0u);
+  _close(b);
+  tests::Bytes file = ReadFile(path);
+  ASSERT_EQ(file.size(), 5003u);
+  EXPECT_EQ(file[4999], 0);
+  EXPECT_EQ(std::string(file.begin() + 5000, file.end()), "abc");
 }
 
-// The window over the first 512 bytes: header words written while the main
-// buffer is elsewhere, read back and written out in order.
-TEST(ZQFileProxyWindow, HeaderWordsBesideAppendsReadBackAndLand) {
-  std::string path = tests::WriteScratch("window.bin", tests::Bytes(600, 'a'));
-  ZQFileProxy f;
-  ASSERT_EQ(f.openfile(path.c_str(), "r+b", 0), 0);
-  // As a memo file grows: a word at offset 0, then a block at the end, many
-  // times; and a record that straddles offset 512.
-  for (int i = 0; i < 200; ++i) {
-    char word[4] = {char('0' + i % 10), 'w', 'x', 'y'};
-    ASSERT_EQ(f.seek(0, 0), 0);
-    ASSERT_EQ(f.write(word, 4), 4);
-    std::string block(100, char('A' + i % 26));
-    ASSERT_EQ(f.seek(600 + 100 * int64_t(i), 0), 600 + 100 * i);
-    ASSERT_EQ(f.write(block.data(), 100), 100);
-  }
-  ASSERT_EQ(f.seek(500, 0), 500);
-  ASSERT_EQ(f.write("0123456789abcdefghij", 20), 20);  // 500..520 across the edge
-  // Reads see every write, before anything is flushed.
-  char got[24] = {0};
-  ASSERT_EQ(f.seek(0, 0), 0);
-  ASSERT_EQ(f.read(got, 4), 4);
-  EXPECT_EQ(std::string(got, 4), "9wxy");
-  ASSERT_EQ(f.seek(505, 0), 505);
-  ASSERT_EQ(f.read(got, 12), 12);
-  EXPECT_EQ(std::string(got, 12), "56789abcdefg");
-  ASSERT_EQ(f.seek(510, 0), 510);
-  EXPECT_EQ(f.getch(), 'a');
-  EXPECT_EQ(f.size(), 600 + 100 * 200);
-  ASSERT_EQ(f.close(true), 0);
+TEST(FileCache, ATruncatingOpenForgetsThePages) {
+  std::string path = ScratchPath("cache-trunc.bin");
+  int a = _open(path.c_str(), kRtReadWrite | kRtCreate | kRtTruncate | kRtBinary);
+  ASSERT_EQ(_write(a, "old text", 8), 8);
+  int b = _open(path.c_str(), kRtReadWrite | kRtCreate | kRtTruncate | kRtBinary);
+  EXPECT_EQ(_lseek(a, 0, 2), 0);
+  ASSERT_EQ(_write(b, "new", 3), 3);
+  _close(b);
+  _close(a);
+  tests::Bytes file = ReadFile(path);
+  EXPECT_EQ(std::string(file.begin(), file.end()), "new");
+}
 
-  tests::Bytes b = tests::ReadFile(path);
-  ASSERT_EQ(b.size(), size_t(600 + 100 * 200));
-  EXPECT_EQ(std::string(b.begin(), b.begin() + 4), "9wxy");
-  EXPECT_EQ(std::string(b.begin() + 4, b.begin() + 8), "aaaa");
-  EXPECT_EQ(std::string(b.begin() + 500, b.begin() + 520), "0123456789abcdefghij");
-  EXPECT_EQ(b[600], 'A');
-  EXPECT_EQ(b[600 + 100 * 199], char('A' + 199 % 26));
+TEST(FileCache, EvictedPagesReachTheFileWhole) {
+  // More pages than the cache holds: the first ones are evicted while the
+  // file is open and must come back as written.
+  std::string path = ScratchPath("cache-evict.bin");
+  int fd = _open(path.c_str(), kRtReadWrite | kRtCreate | kRtTruncate | kRtBinary);
+  filecache::SetPageBudget(64);
+  const int pages = 64 + 100;
+  std::vector<char> page(filecache::kPage);
+  for (int i = 0; i < pages; ++i) {
+    std::fill(page.begin(), page.end(), char('a' + i % 26));
+    ASSERT_EQ(_write(fd, page.data(), uint32_t(page.size())), int32_t(page.size()));
+  }
+  char c = 0;
+  for (int i : {0, 1, pages / 2, pages - 1}) {
+    const int32_t at = int32_t(int64_t(i) * filecache::kPage + 17);
+    ASSERT_EQ(_lseek(fd, at, 0), at);
+    ASSERT_EQ(_read(fd, &c, 1), 1);
+    EXPECT_EQ(c, char('a' + i % 26)) << i;
+  }
+  ASSERT_EQ(_close(fd), 0);
+  tests::Bytes file = ReadFile(path);
+  ASSERT_EQ(file.size(), size_t(pages) * size_t(filecache::kPage));
+  EXPECT_EQ(file[0], 'a');
+  EXPECT_EQ(file[size_t(pages - 1) * size_t(filecache::kPage)], char('a' + (pages - 1) % 26));
+  filecache::SetPageBudget(filecache::kMaxPages);
 }
 
 }  // namespace

@@ -50,10 +50,8 @@ TEST(Trailer, BuiltModuleEndsWithTheNineDefinitions) {
   EXPECT_EQ(GetBe32(end - 16), 9u);
   ASSERT_EQ(GetBe32(end - 12), 1196u);
   const uint8_t* lengths = end - 16 - 36;
-  uint32_t sum = 0;
-  for (int i = 0; i < 9; ++i) sum += GetBe32(lengths + 4 * i);
-  EXPECT_EQ(sum, 1196u - 36u);
-  // Walk the definitions field by field; the walk must end on the lengths.
+  // Walk the definitions field by field: each must take its length, and the
+  // walk must end on the lengths.
   const uint8_t* p = end - 16 - 1196;
   for (int i = 0; i < 9; ++i) {
     const Expected& e = kExpected[i];
@@ -66,8 +64,6 @@ TEST(Trailer, BuiltModuleEndsWithTheNineDefinitions) {
     uint64_t flags = GetBe64(p);
     p += 8;
     EXPECT_EQ(flags, e.flags) << e.key;
-    bool vfp = std::string(e.key) == "DAVFOXPRO";
-    EXPECT_EQ((flags & 0x02) != 0 && (flags & 0x10) != 0, !vfp) << e.key;
     EXPECT_EQ(Cstr(p), e.option);
     EXPECT_EQ(Cstr(p), "dbf");
     EXPECT_EQ(Cstr(p), e.display);
@@ -88,11 +84,9 @@ TEST(Trailer, BuiltModuleEndsWithTheNineDefinitions) {
   std::string why;
   ASSERT_EQ(ParseTrailer(file.data(), file.size(), file.size(), &defs, &why), TrailerStatus::kOk) << why;
   ASSERT_EQ(defs.size(), 9u);
-  EXPECT_EQ(defs[6].short_name, "clipper");
-  EXPECT_EQ(defs[6].option_text, "version=8");
+  EXPECT_EQ(defs[6].short_name + "|" + defs[6].option_text, "clipper|version=8");
+  EXPECT_EQ(defs[0].class_stem + "|" + defs[0].kind, "Dbase|FlatFile");
   EXPECT_EQ(defs[8].flags, 0x0Du);
-  EXPECT_EQ(defs[0].class_stem, "Dbase");
-  EXPECT_EQ(defs[0].kind, "FlatFile");
 }
 
 // A file body followed by a trailer, with a hook to break one part.
@@ -102,20 +96,16 @@ tests::Bytes WithTrailer(const tests::Bytes& body, const std::vector<uint8_t>& t
   return out;
 }
 
-TrailerStatus Parse(const tests::Bytes& f, std::string* why, size_t* count = nullptr) {
+TrailerStatus Parse(const tests::Bytes& f, std::string* why) {
   std::vector<ConnectorDef> defs;
-  TrailerStatus s = ParseTrailer(f.data(), f.size(), f.size(), &defs, why);
-  if (count) *count = defs.size();
-  return s;
+  return ParseTrailer(f.data(), f.size(), f.size(), &defs, why);
 }
 
 TEST(Trailer, DamagedTrailersAreRefusedWithAReason) {
   const tests::Bytes body(64, 0x55);
   const std::vector<uint8_t> good = trailer::EncodeTrailer();
   std::string why;
-  size_t n = 0;
-  EXPECT_EQ(Parse(WithTrailer(body, good), &why, &n), TrailerStatus::kOk);
-  EXPECT_EQ(n, 9u);
+  EXPECT_EQ(Parse(WithTrailer(body, good), &why), TrailerStatus::kOk);
   // No magic: no trailer at all, and nothing to warn about.
   EXPECT_EQ(Parse(body, &why), TrailerStatus::kNone);
   EXPECT_EQ(Parse(tests::Bytes(5, 0), &why), TrailerStatus::kNone);
